@@ -1,0 +1,127 @@
+// What the daemon's services know about the request that they are called for.
+#pragma once
+
+#include <atomic>
+#include <functional>
+#include <list>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+
+namespace requests {
+
+// Why a request became void.
+enum class VoidReason {
+  kCallerGone,
+  kAccountRemoved,
+  kClientRevoked,
+  kStopping,
+  kLimitReached,
+};
+
+// Counts the requests that wait, for each client and in all. Implemented by the request table.
+class WaitingLimiter {
+ public:
+  virtual ~WaitingLimiter() = default;
+  // Whether one more request of the client may wait; where it may, it is counted until endWaiting.
+  virtual bool beginWaiting(const std::string& clientKey) = 0;
+  virtual void endWaiting(const std::string& clientKey) = 0;
+};
+
+// One request on its way through a plug-in. A request that is void has no effect any more: its alert is
+// taken down, its transfers are ended, and no record, credential or log entry is written for it.
+//
+// Thread-safe. Services find the request of a plug-in's call as the calling thread's current one, and
+// keep it with what they start for it (a transfer, an account object).
+class RequestContext {
+ public:
+  // clientKey: tells clients apart for the limits. limiter: may be null (nothing is counted).
+  RequestContext(std::string clientKey, std::shared_ptr<WaitingLimiter> limiter);
+  RequestContext(const RequestContext&) = delete;
+  RequestContext& operator=(const RequestContext&) = delete;
+  ~RequestContext();
+
+  const std::string& clientKey() const { return clientKey_; }
+
+  bool isVoid() const { return voidReason().has_value(); }
+  std::optional<VoidReason> voidReason() const;
+
+  // Makes the request void and runs what was registered with onVoid, on this thread. Waits for an
+  // effect that is being written (see unlessVoid); once this has returned, none begins. The first reason
+  // stays.
+  void makeVoid(VoidReason reason);
+
+  // Unregisters when it is dropped; the callback does not run after that, nor is it still running.
+  class Registration {
+   public:
+    Registration() = default;
+    Registration(Registration&& other) noexcept;
+    Registration& operator=(Registration&& other) noexcept;
+    ~Registration();
+
+   private:
+    friend class RequestContext;
+    Registration(RequestContext* context, std::list<std::function<void()>>::iterator entry);
+    RequestContext* context_ = nullptr;
+    std::list<std::function<void()>>::iterator entry_;
+  };
+
+  // Has the callback run once when the request becomes void, or now where it is. The context must
+  // outlive the registration. Callbacks do not register, drop registrations or wait.
+  [[nodiscard]] Registration onVoid(std::function<void()> callback);
+
+  // Runs the work, which writes an effect of the request, unless the request is void. Returns whether it
+  // ran. The work may call unlessVoid again.
+  bool unlessVoid(const std::function<void()>& work);
+
+  // Held while the request waits for the user or the server.
+  class Waiting {
+   public:
+    explicit Waiting(RequestContext* context);
+    Waiting(const Waiting&) = delete;
+    Waiting& operator=(const Waiting&) = delete;
+    ~Waiting();
+
+   private:
+    RequestContext* context_;
+  };
+
+  // Counts the request as a waiting one until the returned object goes; a request that waits twice at the
+  // same time counts once. Null where the request is void, or where a limit is reached: it is then made
+  // void for that reason.
+  [[nodiscard]] std::unique_ptr<Waiting> beginWaiting();
+
+  // The request that the calling thread is working for; null where it works for none.
+  static std::shared_ptr<RequestContext> current();
+
+  // Makes a request the calling thread's current one as long as the scope lives.
+  class Scope {
+   public:
+    explicit Scope(std::shared_ptr<RequestContext> context);
+    Scope(const Scope&) = delete;
+    Scope& operator=(const Scope&) = delete;
+    ~Scope();
+
+   private:
+    std::shared_ptr<RequestContext> previous_;
+  };
+
+ private:
+  void endWaiting();
+
+  const std::string clientKey_;
+  const std::shared_ptr<WaitingLimiter> limiter_;
+
+  std::recursive_mutex effects_;  // held while an effect is written, and while the reason is set
+  mutable std::mutex reasonMutex_;
+  std::optional<VoidReason> reason_;
+
+  std::recursive_mutex callbacksMutex_;
+  std::list<std::function<void()>> callbacks_;
+
+  std::mutex waitingMutex_;
+  int waiting_ = 0;
+};
+
+}  // namespace requests
