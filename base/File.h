@@ -30,11 +30,12 @@ class FileDescriptor {
   int descriptor_ = -1;
 };
 
-// The whole content of a regular file of at most `limit` bytes. A device, a pipe or a directory is a
-// problem and is not waited for. The problem's text names the path.
+// The whole content of a regular file of at most `limit` bytes. Failures: kNotFound where there is no file;
+// kInvalid for a larger one and for a device, a pipe or a directory, which are not waited for. The message
+// names the path.
 Result<std::string> readFile(const std::string& path, std::size_t limit);
 
-// The same for a file that is open already; `name` is what the problem's text calls it.
+// The same for a file that is open already; `name` is what the message calls it.
 Result<std::string> readFile(const FileDescriptor& file, const std::string& name, std::size_t limit);
 
 }  // namespace base

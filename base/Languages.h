@@ -2,17 +2,17 @@
 #pragma once
 
 #include <string>
-#include <string_view>
 #include <vector>
 
 namespace base {
 
-// The values of the environment's variables of these names; empty where one is not set.
+// The values of the environment's variables LANGUAGE, LC_ALL, LC_MESSAGES and LANG; empty where one is not
+// set.
 struct LanguageVariables {
-  std::string LANGUAGE;
-  std::string LC_ALL;
-  std::string LC_MESSAGES;
-  std::string LANG;
+  std::string language;
+  std::string lcAll;
+  std::string lcMessages;
+  std::string lang;
 };
 
 // The user's languages as names of translations: "de_AT.UTF-8@euro" gives de_AT@euro, de_AT, de@euro and
