@@ -19,7 +19,7 @@ enum class TransferErrorCode {
   kUnreadableAnswer,  // what came is not HTTP
   kNoBody,            // an answer came, without a body
   kAnswerTooLarge,    // the answer's header or body is over the limit
-  kTokenNotSendable,  // the access token holds characters that no header can carry
+  kNotSendable,       // a value that the exchange cannot carry: see the description
   kCancelled,         // nobody wants the answer any more
   kStopping,          // the daemon is stopping
   kFailed,            // anything else
