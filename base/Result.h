@@ -1,14 +1,14 @@
-// What an operation answers that can fail for a reason worth telling a person.
+// What an operation came to: a value, or why there is none.
 #pragma once
 
 #include <string>
+#include <type_traits>
 #include <utility>
 #include <variant>
 
 namespace base {
 
-// What a caller can make of a problem.
-enum class ProblemKind {
+enum class FailureKind {
   kFailed,    // it could not be done; trying again later may help
   kInvalid,   // what was asked for makes no sense
   kNotFound,  // what it was asked for is not there
@@ -16,53 +16,49 @@ enum class ProblemKind {
   kDamaged,   // what is stored cannot be read
 };
 
-// Why something could not be done: a text for a log line or for standard error. Holds no secret.
-struct Problem {
-  std::string text;
-  ProblemKind kind = ProblemKind::kFailed;
+// message: one sentence for a person, without a full stop at its end and without any secret.
+struct Failure {
+  FailureKind kind = FailureKind::kFailed;
+  std::string message;
 };
 
-// A value, or the problem that stood in its way.
-template <typename Value>
+template <typename T>
 class [[nodiscard]] Result {
  public:
-  Result(Value value)
-      : content_(std::move(value)) {}
-  Result(Problem problem)
-      : content_(std::move(problem)) {}
+  Result(T value)
+      : content_(std::in_place_index<0>, std::move(value)) {}
+  Result(Failure failure)
+      : content_(std::in_place_index<1>, std::move(failure)) {}
 
-  bool hasValue() const { return std::holds_alternative<Value>(content_); }
-  explicit operator bool() const { return hasValue(); }
+  explicit operator bool() const { return content_.index() == 0; }
 
-  // Only where there is one; anything else is a bug and throws std::bad_variant_access.
-  const Value& value() const& { return std::get<Value>(content_); }
-  Value& value() & { return std::get<Value>(content_); }
-  Value&& value() && { return std::get<Value>(std::move(content_)); }
+  // Only where there is a value.
+  T& operator*() & { return std::get<0>(content_); }
+  const T& operator*() const& { return std::get<0>(content_); }
+  T&& operator*() && { return std::get<0>(std::move(content_)); }
+  T* operator->() { return &std::get<0>(content_); }
+  const T* operator->() const { return &std::get<0>(content_); }
 
-  // Only where there is no value.
-  const std::string& problem() const { return reason().text; }
-  const Problem& reason() const { return std::get<Problem>(content_); }
+  // Only where there is none.
+  const Failure& failure() const { return std::get<1>(content_); }
 
  private:
-  std::variant<Value, Problem> content_;
+  static_assert(!std::is_same_v<std::decay_t<T>, Failure>);
+  std::variant<T, Failure> content_;
 };
 
-// Success, or the problem that stood in its way.
 template <>
 class [[nodiscard]] Result<void> {
  public:
   Result() = default;  // success
-  Result(Problem problem)
-      : content_(std::move(problem)) {}
+  Result(Failure failure)
+      : content_(std::move(failure)) {}
 
   explicit operator bool() const { return content_.index() == 0; }
-
-  // Only where it failed.
-  const std::string& problem() const { return reason().text; }
-  const Problem& reason() const { return std::get<Problem>(content_); }
+  const Failure& failure() const { return std::get<1>(content_); }
 
  private:
-  std::variant<std::monostate, Problem> content_;
+  std::variant<std::monostate, Failure> content_;
 };
 
 }  // namespace base
