@@ -1,0 +1,72 @@
+// What was decided about each client's access.
+#pragma once
+
+#include <chrono>
+#include <functional>
+#include <map>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <shared_mutex>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/Result.h"
+#include "daemon/records/Database.h"
+#include "daemon/state/Clock.h"
+#include "host/RVLog.h"
+#include "host/Values.h"
+
+namespace records {
+
+struct AuthorizationRecord {
+  std::string accountType;
+  std::string clientId;
+  bool granted = false;
+  std::optional<RVPermissionSet> permissions;
+  std::optional<RVDictionary> options;
+  std::chrono::sys_seconds changed{};
+};
+
+// Reads come from memory and never wait for the disk; a write is on the disk when it returns. Thread-safe.
+class AuthorizationRecords {
+ public:
+  // Reads every record. One that cannot be read is left out, with an error in the log. The database and the
+  // log outlive the object.
+  static base::Result<std::unique_ptr<AuthorizationRecords>> load(Database& database,
+                                                                  RVLogService& log,
+                                                                  state::Clock clock);
+
+  // Has the listener called after each write, on the thread that wrote, with the account type whose records
+  // changed. Set before the first write; must not write itself.
+  void onChange(std::function<void(const std::string& accountType)> listener);
+
+  std::optional<AuthorizationRecord> find(std::string_view accountType, std::string_view clientId) const;
+
+  // In byte order of the client IDs.
+  std::vector<AuthorizationRecord> list(std::string_view accountType) const;
+
+  // Stores the record in place of the client's earlier one, with the current time as its `changed`.
+  base::Result<void> put(AuthorizationRecord record);
+
+  base::Result<void> removeAll(const std::string& accountType);
+
+  // Removes a standing refusal. kNotFound: the client has no record. kRefused: it holds a grant.
+  base::Result<void> forgetRefusal(const std::string& accountType, const std::string& clientId);
+
+ private:
+  using OfType = std::map<std::string, AuthorizationRecord, std::less<>>;
+
+  AuthorizationRecords(Database& database, state::Clock clock);
+  void announce(const std::string& accountType) const;
+
+  Database& database_;
+  const state::Clock clock_;
+  std::function<void(const std::string&)> listener_;
+  std::mutex writes_;  // held from before a write until memory shows it
+  mutable std::shared_mutex mutex_;
+  std::map<std::string, OfType, std::less<>> records_;  // guarded by mutex_
+};
+
+}  // namespace records
