@@ -5,7 +5,6 @@
 #include <memory>
 #include <mutex>
 #include <optional>
-#include <source_location>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -274,15 +273,18 @@ class TKFacebookAccountAccessPlugin final : public RVDAccountAccessPlugin {
 
   // ---- Shared by all of the above ----
 
-  // Writes a line of the log, with the place of the call as its source line.
+  // Writes a line of the log, with the line of the call as its source line.
   void log(int level,
            std::string_view functionName,
            std::string_view format,
            const Arguments& arguments = {},
-           std::source_location place = std::source_location::current()) const;
+           int line = __builtin_LINE()) const;
 
   // The text of this plug-in's string table for the key, absent only where the host has none at all.
   std::optional<std::string> localized(std::string_view key) const;
+
+  // The same, with the key itself where the host has no table at all.
+  std::string localizedText(std::string_view key) const;
 
   // The table's text for the key, filled with the arguments.
   std::string localizedFormat(std::string_view key, const Arguments& arguments) const;
