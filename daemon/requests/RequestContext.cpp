@@ -13,9 +13,12 @@ void runOnce(std::function<void()>& callback) {
 
 }  // namespace
 
-RequestContext::RequestContext(std::string clientKey, std::shared_ptr<WaitingLimiter> limiter)
+RequestContext::RequestContext(std::string clientKey,
+                               std::shared_ptr<WaitingLimiter> limiter,
+                               RVDictionary details)
     : clientKey_(std::move(clientKey)),
-      limiter_(std::move(limiter)) {
+      limiter_(std::move(limiter)),
+      details_(std::move(details)) {
 }
 
 RequestContext::~RequestContext() = default;

@@ -1,13 +1,14 @@
 // What the daemon's services know about the request that they are called for.
 #pragma once
 
-#include <atomic>
 #include <functional>
 #include <list>
 #include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
+
+#include "host/Values.h"
 
 namespace requests {
 
@@ -36,13 +37,17 @@ class WaitingLimiter {
 // keep it with what they start for it (a transfer, an account object).
 class RequestContext {
  public:
-  // clientKey: tells clients apart for the limits. limiter: may be null (nothing is counted).
-  RequestContext(std::string clientKey, std::shared_ptr<WaitingLimiter> limiter);
+  // clientKey: tells clients apart for the limits. limiter: may be null (nothing is counted). details: see
+  // clientDetails.
+  RequestContext(std::string clientKey, std::shared_ptr<WaitingLimiter> limiter, RVDictionary details = {});
   RequestContext(const RequestContext&) = delete;
   RequestContext& operator=(const RequestContext&) = delete;
   ~RequestContext();
 
   const std::string& clientKey() const { return clientKey_; }
+
+  // What an alert tells about the client besides the plug-in's words, by the keys of Agent1's description.
+  const RVDictionary& clientDetails() const { return details_; }
 
   bool isVoid() const { return voidReason().has_value(); }
   std::optional<VoidReason> voidReason() const;
@@ -112,7 +117,10 @@ class RequestContext {
 
   const std::string clientKey_;
   const std::shared_ptr<WaitingLimiter> limiter_;
+  const RVDictionary details_;
 
+  // Locks are taken in this order: effects_, reasonMutex_; callbacksMutex_, reasonMutex_; waitingMutex_,
+  // the limiter's own.
   std::recursive_mutex effects_;  // held while an effect is written, and while the reason is set
   mutable std::mutex reasonMutex_;
   std::optional<VoidReason> reason_;

@@ -1,0 +1,245 @@
+#include "daemon/requests/RequestTable.h"
+
+#include <algorithm>
+#include <atomic>
+#include <exception>
+#include <iterator>
+#include <thread>
+#include <utility>
+
+namespace requests {
+namespace {
+
+// A list of permissions without its order and repetitions: the names in byte order, then what is no name.
+RVValue asSet(const RVValue& permissions) {
+  if (permissions.array() == nullptr) return permissions;
+  RVPermissionSet names;
+  RVArray others;
+  for (const RVValue& element : *permissions.array()) {
+    if (element.string() != nullptr)
+      names.insert(*element.string());
+    else
+      others.push_back(element);
+  }
+  RVArray all(names.begin(), names.end());
+  all.insert(all.end(), others.begin(), others.end());
+  return all;
+}
+
+std::optional<RVValue> valueForKey(const RVDictionary& options, std::string_view key) {
+  const RVValue* value = RVValueForKey(options, key);
+  return value != nullptr ? std::optional(*value) : std::nullopt;
+}
+
+}  // namespace
+
+RequestKey RequestKey::forOptions(std::string clientKey,
+                                  std::string accountType,
+                                  const RVDictionary& options) {
+  RequestKey key{std::move(clientKey),
+                 std::move(accountType),
+                 valueForKey(options, RVFacebookAppIdKey),
+                 valueForKey(options, RVFacebookPermissionsKey),
+                 valueForKey(options, RVFacebookAudienceKey)};
+  if (key.permissions) key.permissions = asSet(*key.permissions);
+  return key;
+}
+
+struct RequestTable::Request {
+  const RequestKey key;
+  const bool isShared;
+  const std::shared_ptr<RequestContext> context;
+  std::vector<Caller> callers;  // protected by the table's lock
+};
+
+// What is owed to the callers of a request: pays with a failure when the plug-in lets go of it unpaid.
+//
+// What the plug-in answers on the thread of its call is held back until the call has returned, because
+// a call that throws has failed, whatever it said before. An answer on another thread is paid at once.
+class RequestTable::Debt {
+ public:
+  Debt(RequestTable* table, std::shared_ptr<Request> request)
+      : table_(table),
+        request_(std::move(request)) {}
+  Debt(const Debt&) = delete;
+  Debt& operator=(const Debt&) = delete;
+  ~Debt() { pay({}); }
+
+  void run(const Work& work, const std::shared_ptr<Debt>& self) {
+    callThread_ = std::this_thread::get_id();
+    isCalling_ = true;
+    work([self](bool granted, const std::optional<RVError>& error) {
+      self->answer({Outcome::Kind::kDecided, granted, error});
+    });
+    isCalling_ = false;
+    if (held_) pay(*std::move(held_));
+  }
+
+  void pay(Outcome outcome) {
+    if (!isPaid_.test_and_set()) table_->finish(request_, std::move(outcome));
+  }
+
+ private:
+  void answer(Outcome outcome) {
+    if (std::this_thread::get_id() != callThread_ || !isCalling_)
+      pay(std::move(outcome));
+    else if (!held_)
+      held_ = std::move(outcome);
+  }
+
+  RequestTable* const table_;
+  const std::shared_ptr<Request> request_;
+  std::atomic_flag isPaid_;
+  std::thread::id callThread_;  // set before the completion exists
+  // Of the call's thread alone.
+  bool isCalling_ = false;
+  std::optional<Outcome> held_;
+};
+
+RequestTable::RequestTable(RequestPool& pool, Observer observer)
+    : pool_(pool),
+      observer_(std::move(observer)) {
+}
+
+void RequestTable::submit(RequestKey key,
+                          Caller caller,
+                          std::shared_ptr<WaitingLimiter> limiter,
+                          RVDictionary details,
+                          Work work) {
+  auto context = std::make_shared<RequestContext>(key.clientKey, std::move(limiter), std::move(details));
+  const auto request = std::make_shared<Request>(Request{std::move(key), true, std::move(context), {}});
+  {
+    const std::lock_guard lock(mutex_);
+    const auto [first, last] = requests_.equal_range(request->key.clientKey);
+    const auto equal = std::find_if(first, last, [&](const auto& entry) {
+      const Request& other = *entry.second;
+      return other.isShared && other.key == request->key && !other.context->isVoid();
+    });
+    const auto& joined = equal != last ? equal->second : request;
+    requestsOfCaller_.emplace(caller.name, joined);
+    joined->callers.push_back(std::move(caller));
+    if (joined != request) return;
+    requests_.emplace(request->key.clientKey, request);
+  }
+  begin(request, std::move(work));
+}
+
+void RequestTable::submitAlone(RequestKey key,
+                               Caller caller,
+                               std::shared_ptr<WaitingLimiter> limiter,
+                               Work work) {
+  auto context = std::make_shared<RequestContext>(key.clientKey, std::move(limiter));
+  const auto request = std::make_shared<Request>(Request{std::move(key), false, std::move(context), {}});
+  {
+    const std::lock_guard lock(mutex_);
+    requestsOfCaller_.emplace(caller.name, request);
+    request->callers.push_back(std::move(caller));
+    requests_.emplace(request->key.clientKey, request);
+  }
+  begin(request, std::move(work));
+}
+
+void RequestTable::begin(const std::shared_ptr<Request>& request, Work work) {
+  const auto debt = std::make_shared<Debt>(this, request);
+  std::optional<VoidReason> reason;
+  {
+    const std::lock_guard lock(mutex_);
+    for (const auto& [barrierReason, selection] : barriers_)
+      if (!reason && selection(request->key)) reason = barrierReason;
+  }
+  if (reason) {
+    request->context->makeVoid(*reason);
+    return debt->pay({});
+  }
+  pool_.submit([this, debt, context = request->context, work = std::move(work)] {
+    const RequestContext::Scope scope(context);
+    try {
+      if (!context->isVoid()) debt->run(work, debt);
+      return;
+    } catch (const std::exception& exception) {
+      observer_.failed(exception.what());
+    } catch (...) {
+      observer_.failed("an exception of an unknown type");
+    }
+    debt->pay({});
+  });
+}
+
+void RequestTable::finish(const std::shared_ptr<Request>& request, Outcome outcome) {
+  std::vector<Caller> callers;
+  {
+    const std::lock_guard lock(mutex_);
+    callers.swap(request->callers);
+    const auto remove = [&](auto& map, const std::string& key) {
+      auto [entry, last] = map.equal_range(key);
+      while (entry != last) entry = entry->second == request ? map.erase(entry) : std::next(entry);
+    };
+    remove(requests_, request->key.clientKey);
+    for (const Caller& caller : callers) remove(requestsOfCaller_, caller.name);
+  }
+  if (const auto reason = request->context->voidReason()) {
+    outcome = {*reason == VoidReason::kLimitReached ? Outcome::Kind::kLimitReached : Outcome::Kind::kVoid,
+               false,
+               std::nullopt};
+    observer_.endedVoid(request->context);
+  }
+  for (const Caller& caller : callers) caller.answer(outcome);
+}
+
+void RequestTable::callerLeft(const std::string& name) {
+  std::vector<Caller> left;  // destroyed without the lock
+  std::vector<std::shared_ptr<Request>> abandoned;
+  {
+    const std::lock_guard lock(mutex_);
+    const auto [first, last] = requestsOfCaller_.equal_range(name);
+    for (auto entry = first; entry != last; ++entry) {
+      auto& callers = entry->second->callers;
+      const auto gone = std::stable_partition(
+          callers.begin(), callers.end(), [&](const Caller& caller) { return caller.name != name; });
+      std::move(gone, callers.end(), std::back_inserter(left));
+      callers.erase(gone, callers.end());
+      if (callers.empty()) abandoned.push_back(entry->second);
+    }
+    requestsOfCaller_.erase(first, last);
+    // From here on nobody can join them.
+    for (const auto& request : abandoned) {
+      auto [entry, end] = requests_.equal_range(request->key.clientKey);
+      while (entry != end) entry = entry->second == request ? requests_.erase(entry) : std::next(entry);
+    }
+  }
+  if (abandoned.empty()) return;
+  const auto makeThemVoid = [abandoned] {
+    for (const auto& request : abandoned) request->context->makeVoid(VoidReason::kCallerGone);
+  };
+  if (!pool_.submit(makeThemVoid)) makeThemVoid();
+}
+
+RequestTable::Barrier RequestTable::makeVoid(VoidReason reason, Selection selection) {
+  std::vector<std::shared_ptr<RequestContext>> selected;
+  std::unique_lock lock(mutex_);
+  for (const auto& [client, request] : requests_)
+    if (selection(request->key)) selected.push_back(request->context);
+  const auto entry = barriers_.emplace(barriers_.end(), reason, std::move(selection));
+  lock.unlock();
+  for (const auto& context : selected) context->makeVoid(reason);
+  return Barrier(this, entry);
+}
+
+RequestTable::Barrier::Barrier(RequestTable* table,
+                               std::list<std::pair<VoidReason, Selection>>::iterator entry)
+    : table_(table),
+      entry_(entry) {
+}
+
+RequestTable::Barrier::Barrier(Barrier&& other) noexcept
+    : table_(std::exchange(other.table_, nullptr)),
+      entry_(other.entry_) {
+}
+
+RequestTable::Barrier::~Barrier() {
+  if (table_ == nullptr) return;
+  const std::lock_guard lock(table_->mutex_);
+  table_->barriers_.erase(entry_);
+}
+
+}  // namespace requests
