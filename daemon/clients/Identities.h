@@ -65,7 +65,7 @@ class Identities {
     Identity identity;
   };
   std::shared_ptr<Connection> connectionOf(const std::string& uniqueName);
-  bool isOwnUser(const std::string& uniqueName, const std::shared_ptr<Connection>& connection);
+  bool belongsToOwnUser(const std::string& uniqueName, const std::shared_ptr<Connection>& connection);
   void forgetUnanswered(const std::string& uniqueName, const std::shared_ptr<Connection>& connection);
 
   BusDriver& bus_;

@@ -11,7 +11,7 @@
 namespace config {
 
 // kSettings: strict. A line that is neither blank, a comment ("#" or ";"), a section nor an entry is a
-// problem, and so are a repeated section, a repeated key, and a text that is not UTF-8. Blanks around keys
+// fault, and so are a repeated section, a repeated key, and a text that is not UTF-8. Blanks around keys
 // and values do not count.
 // kDesktopEntry: entries may be localized ("Name[de]=…"), values have the escapes \s \n \t \r \\, comments
 // begin with "#". Lines that mean nothing are skipped; of what is repeated the first counts.
@@ -43,7 +43,7 @@ struct IniFile {
   const IniSection* section(std::string_view name) const;
 };
 
-// `name` is what the problem's text calls the file ("name:line: what is wrong").
+// `name` is what the failure's message calls the file ("name:line: what is wrong").
 base::Result<IniFile> parseIni(std::string_view text, const std::string& name, IniFlavour flavour);
 
 }  // namespace config

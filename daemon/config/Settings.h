@@ -36,8 +36,8 @@ struct Settings {
 using URLCheck = std::function<std::optional<std::string>(const std::string& url)>;
 
 // Reads the files in order; what a later one sets goes before what an earlier one set. A file that is not
-// there sets nothing where `mustExist` is false. The problem names the file, and where it is in a line, the
-// line and the key.
+// there sets nothing where `mustExist` is false. The failure's message names the file, and where it is in a
+// line, the line and the key.
 base::Result<Settings> readSettings(const std::vector<std::string>& paths,
                                     bool mustExist,
                                     const URLCheck& checkURL);

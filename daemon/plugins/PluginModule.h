@@ -17,7 +17,8 @@ class PluginModule {
  public:
   // Loads "<bundle>/<the bundle's last name>.so" and makes its plug-in object. services: as they are for
   // every plug-in; the string table is replaced by the bundle's own. languages: see base::languageChain.
-  // Nothing of a module whose ABI version is not the daemon's is called. The problem's text names the file.
+  // Nothing of a module whose ABI version is not the daemon's is called. The failure's message names the
+  // file.
   static base::Result<std::unique_ptr<PluginModule>> load(const std::string& bundle,
                                                           const RVDHostServices& services,
                                                           const std::vector<std::string>& languages);
