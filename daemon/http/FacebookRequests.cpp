@@ -138,9 +138,9 @@ class FacebookRequests::Server {
  private:
   Transfer transferFor(const std::string& exchangeName, Form form, std::optional<RVSecret> token) const {
     // A URL that cannot be used is passed on as it is: the transfer fails and says why.
-    const ServerURLReading server = readServerURL(*settings_.url);
+    const std::optional<ServerURL> server = readServerURL(*settings_.url);
     Transfer transfer;
-    transfer.url = server.url ? server.url->text + "/" + exchangeName : *settings_.url;
+    transfer.url = server ? server->text + "/" + exchangeName : *settings_.url;
     transfer.form = std::move(form);
     transfer.bearerToken = std::move(token);
     transfer.acceptLanguage = acceptLanguage_;

@@ -55,10 +55,10 @@ OpenTransfer::~OpenTransfer() {
 }
 
 std::optional<RVError> OpenTransfer::prepare() {
-  const ServerURLReading reading = readServerURL(transfer_.url);
-  if (reading.problem)
-    return transferError(TransferErrorCode::kServerNotAllowed, "its URL " + *reading.problem);
-  isEncrypted_ = reading.url->isEncrypted;
+  if (const auto problem = problemWithServerURL(transfer_.url))
+    return transferError(TransferErrorCode::kServerNotAllowed, "its URL " + *problem);
+  const std::optional<ServerURL> url = readServerURL(transfer_.url);
+  isEncrypted_ = url->isEncrypted;
 
   handle_.reset(curl_easy_init());
   if (handle_ == nullptr) return transferError(TransferErrorCode::kFailed);
@@ -68,7 +68,7 @@ std::optional<RVError> OpenTransfer::prepare() {
                          "the access token holds characters that no header can carry");
   }
   writeForm();
-  setWhatIsSent(reading.url->text);
+  setWhatIsSent(url->text);
   setLimits();
   setTrust();
   if (areSettingsTaken_) return std::nullopt;

@@ -6,6 +6,7 @@
 
 #include <algorithm>
 #include <memory>
+#include <variant>
 
 #include "daemon/http/Loopback.h"
 
@@ -36,47 +37,53 @@ bool isOutOfPlace(char character) {
   return byte <= 0x20 || byte >= 0x7f || character == '\\';
 }
 
-ServerURLReading problem(std::string text) {
-  return {std::nullopt, std::move(text)};
-}
+using Reading = std::variant<ServerURL, std::string>;  // the URL, or the problem
 
-}  // namespace
-
-ServerURLReading readServerURL(const std::string& text) {
-  if (text.empty()) return problem("is empty");
+Reading read(const std::string& text) {
+  if (text.empty()) return "is empty";
   if (std::any_of(text.begin(), text.end(), isOutOfPlace))
-    return problem("holds a blank, a backslash or a character outside ASCII");
-  if (text.find('?') != std::string::npos) return problem("has a query");
-  if (text.find('#') != std::string::npos) return problem("has a fragment");
+    return "holds a blank, a backslash or a character outside ASCII";
+  if (text.find('?') != std::string::npos) return "has a query";
+  if (text.find('#') != std::string::npos) return "has a fragment";
 
   const URL url(curl_url(), &curl_url_cleanup);
   switch (curl_url_set(url.get(), CURLUPART_URL, text.c_str(), CURLU_DISALLOW_USER)) {
     case CURLUE_OK:
       break;
     case CURLUE_USER_NOT_ALLOWED:
-      return problem("has a user name");
+      return "has a user name";
     case CURLUE_UNSUPPORTED_SCHEME:
-      return problem("is neither https nor http");
+      return "is neither https nor http";
     default:
-      return problem("cannot be read as a URL");
+      return "cannot be read as a URL";
   }
   const std::string scheme = partOf(url, CURLUPART_SCHEME);
   const std::string host = partOf(url, CURLUPART_HOST);
   const bool isEncrypted = scheme == "https";
-  if (!isEncrypted && scheme != "http") return problem("is neither https nor http");
-  if (host.empty()) return problem("has no host");
-  if (!partOf(url, CURLUPART_ZONEID).empty()) return problem("has a network interface in its host");
+  if (!isEncrypted && scheme != "http") return "is neither https nor http";
+  if (host.empty()) return "has no host";
+  if (!partOf(url, CURLUPART_ZONEID).empty()) return "has a network interface in its host";
   if (!isEncrypted && !isLoopbackHost(host))
-    return problem("is plain http to a host that is not this machine's loopback address");
+    return "is plain http to a host that is not this machine's loopback address";
 
   std::string normal = partOf(url, CURLUPART_URL);
-  if (normal.empty()) return problem("cannot be read as a URL");
+  if (normal.empty()) return "cannot be read as a URL";
   while (normal.back() == '/') normal.pop_back();
-  return {ServerURL{std::move(normal), isEncrypted}, std::nullopt};
+  return ServerURL{std::move(normal), isEncrypted};
 }
 
+}  // namespace
+
 std::optional<std::string> problemWithServerURL(const std::string& text) {
-  return readServerURL(text).problem;
+  const Reading reading = read(text);
+  const auto* problem = std::get_if<std::string>(&reading);
+  return problem != nullptr ? std::optional(*problem) : std::nullopt;
+}
+
+std::optional<ServerURL> readServerURL(const std::string& text) {
+  const Reading reading = read(text);
+  const auto* url = std::get_if<ServerURL>(&reading);
+  return url != nullptr ? std::optional(*url) : std::nullopt;
 }
 
 }  // namespace http

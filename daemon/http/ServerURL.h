@@ -12,16 +12,12 @@ struct ServerURL {
   bool isEncrypted = false;  // https; otherwise plain http to a loopback address
 };
 
-// The URL, or what is wrong with it, as the end of a sentence that begins with "The server URL". Allowed
-// are https to any host, and plain http to a loopback address: 127.0.0.0/8, [::1] or "localhost". A port
-// and a path may stand in it; a user name, a query or a fragment may not. Exactly one of the two is set.
-struct ServerURLReading {
-  std::optional<ServerURL> url;
-  std::optional<std::string> problem;
-};
-ServerURLReading readServerURL(const std::string& text);
-
-// readServerURL's problem alone, for whoever reads the settings.
+// What is wrong with the URL, as the end of a sentence that begins with "The server URL"; nothing where it
+// can be used. Allowed are https to any host, and plain http to a loopback address: 127.0.0.0/8, [::1] or
+// "localhost". A port and a path may stand in it; a user name, a query or a fragment may not.
 std::optional<std::string> problemWithServerURL(const std::string& text);
+
+// The URL; absent where there is a problem with it.
+std::optional<ServerURL> readServerURL(const std::string& text);
 
 }  // namespace http
