@@ -39,8 +39,9 @@ using RVDAccessCompletion = std::function<void(bool granted, const std::optional
 
 // Decides about access to the accounts of the types that it supports. One object serves all calls, from
 // any number of threads at a time; calls may block for as long as the user or the server takes. What is
-// handed to a call is kept alive until its completion has run. An exception of a host service passes
-// through to the caller, after the completion has been given as (false, no error).
+// handed to a call is kept alive until its completion has run; the object itself is destroyed only when
+// every call has returned and its completion has run. An exception of a host service passes through to the
+// caller, after the completion has been given as (false, no error).
 class RVDAccountAccessPlugin {
  public:
   virtual ~RVDAccountAccessPlugin() = default;

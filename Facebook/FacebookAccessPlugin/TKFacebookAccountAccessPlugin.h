@@ -5,6 +5,7 @@
 #include <memory>
 #include <mutex>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -20,7 +21,9 @@ inline constexpr std::string_view TKFacebookPermissionCategoryWrite = "write";
 inline constexpr std::string_view TKFacebookPermissionCategoryManage = "manage";
 
 // One object serves the daemon for the life of the process, from any number of threads. It keeps no
-// state between calls but the permission lists, each filled once, when it is first asked for.
+// state between calls but the permission lists, each filled once, when it is first asked for. Handlers
+// that wait for the server point back to the object, which therefore outlives its calls (see
+// RVDAccountAccessPlugin); a handler that is dropped unused does not touch it any more.
 //
 // Operations whose names begin with an underscore are the class's own; the comment above each gives its
 // whole name, which is also the function name of its log lines.
@@ -33,11 +36,16 @@ class TKFacebookAccountAccessPlugin final : public RVDAccountAccessPlugin {
   static bool supportsAccountTypeWithIdentifier(const std::optional<std::string>& identifier);
 
   // init
-  // Fills the category names and nothing else. The services must outlive the object; preferences, serial
-  // queues and notifications must outlive the process's last use of any object of this class.
+  // Null where a service is missing, since the object could then only fail later, in the middle of a
+  // request.
+  static std::unique_ptr<TKFacebookAccountAccessPlugin> init(const RVDHostServices& services);
+
+  // Fills the category names and nothing else. services: all of them, outliving the object; preferences,
+  // serial queues and notifications outlive the process's last use of any object of this class.
   explicit TKFacebookAccountAccessPlugin(const RVDHostServices& services);
 
-  // ---- The daemon's calls: AccessRequest.cpp; the contracts are in RVDAccountAccessPlugin.h ----
+  // ---- The daemon's calls; the contracts are in RVDAccountAccessPlugin.h. The request: AccessRequest.cpp;
+  // the direct calls: DirectAccess.cpp ----
 
   // handleAccessRequestToAccountsOfType:forClient:withOptions:store:allowUserInteraction:completion:
   // allowUserInteraction is not looked at: a request that needs the user's consent asks for it.
@@ -90,7 +98,17 @@ class TKFacebookAccountAccessPlugin final : public RVDAccountAccessPlugin {
 
   // _shouldIgnoreAccessRequest
   // Whether the user has set the preference to ignore access requests. Waits for the preferences queue.
+  // The first call in the process has the preferences read anew whenever the environment changes.
   bool _shouldIgnoreAccessRequest() const;
+
+  // What the process has one of, however many objects of the class there are: the queue on which
+  // preferences are read, and the registration for changes of the environment. Never released.
+  struct PreferencesState {
+    std::mutex mutex;  // guards the first use of each
+    std::shared_ptr<ZQSerialQueue> queue;
+    std::optional<int> registrationToken;
+  };
+  static std::unique_ptr<PreferencesState>& preferencesState();
 
   // ---- Requests and the user's answer: AccessRequest.cpp ----
 
@@ -111,6 +129,32 @@ class TKFacebookAccountAccessPlugin final : public RVDAccountAccessPlugin {
                            bool shouldSkipServer,
                            const std::shared_ptr<RVDAccountStore>& store,
                            const RVDAccessCompletion& completion) const;
+
+  // The permissions that an earlier grant already gives a request: none for another app ID, and none to
+  // write where the audience has changed.
+  RVPermissionSet creditForRequest(const RVDClientAuthorization& authorization,
+                                   const std::optional<std::string>& appID,
+                                   const RVPermissionSet& requestedPermissions,
+                                   const std::optional<std::string>& audience) const;
+
+  // ---- Direct calls: DirectAccess.cpp ----
+
+  // What the server grants the application now; waits for its answer. Empty where it grants nothing or
+  // gives no answer.
+  RVPermissionSet permissionsGrantedByServer(const std::shared_ptr<const RVDClient>& client,
+                                             const std::string& appID,
+                                             const std::shared_ptr<RVAccount>& account) const;
+
+  // The app ID that the record remembers.
+  std::optional<std::string> appIDOf(const RVDClientAuthorization& authorization) const;
+
+  // Has the client's token invalidated and its credential removed, where the record names an app ID.
+  // session: gives the session to use; asked only then.
+  void revokeToken(std::string_view functionName,
+                   const RVDClientAuthorization& authorization,
+                   const RVDClient& client,
+                   const RVAccount& account,
+                   const std::function<std::shared_ptr<TKFacebookSession>()>& session) const;
 
   // ---- The options of a request: Options.cpp ----
 
@@ -255,6 +299,13 @@ class TKFacebookAccountAccessPlugin final : public RVDAccountAccessPlugin {
                                         const std::shared_ptr<RVAccount>& account,
                                         const ServerCompletion& completion) const;
 
+  // Judges the server's answer to that; pays the completion.
+  void judgeAuthorizationAnswer(const std::optional<std::string>& body,
+                                const std::optional<RVError>& error,
+                                const RVDClient& client,
+                                RVAccount& account,
+                                const ServerCompletion& completion) const;
+
   // _serverAudienceStringForAudience:
   // The audience in the server's words; absent where it is none of the three that are known.
   std::optional<std::string> _serverAudienceStringForAudience(
@@ -280,6 +331,13 @@ class TKFacebookAccountAccessPlugin final : public RVDAccountAccessPlugin {
            const Arguments& arguments = {},
            int line = __builtin_LINE()) const;
 
+  // An error of an access decision, with its text where there is one for a person.
+  static RVError accessError(int code, std::optional<std::string> localizedDescription = std::nullopt);
+
+  // The names in a list of permissions; the empty set for an absent list. An element of another type
+  // names nothing.
+  static RVPermissionSet permissionNames(const RVArray* list);
+
   // The text of this plug-in's string table for the key, absent only where the host has none at all.
   std::optional<std::string> localized(std::string_view key) const;
 
@@ -293,6 +351,8 @@ class TKFacebookAccountAccessPlugin final : public RVDAccountAccessPlugin {
   struct LazyList {
     std::once_flag filled;
     std::unique_ptr<const RVPermissionSet> names;
+
+    const RVPermissionSet& filledWith(std::span<const std::string_view> literals);
   };
 
   RVDHostServices services_;
