@@ -9,10 +9,10 @@ namespace base {
 // The values of the environment's variables LANGUAGE, LC_ALL, LC_MESSAGES and LANG; empty where one is not
 // set.
 struct LanguageVariables {
-  std::string language;
-  std::string lcAll;
-  std::string lcMessages;
-  std::string lang;
+  std::string language = {};
+  std::string lcAll = {};
+  std::string lcMessages = {};
+  std::string lang = {};
 };
 
 // The user's languages as names of translations: "de_AT.UTF-8@euro" gives de_AT@euro, de_AT, de@euro and
