@@ -150,6 +150,7 @@ void TransferThread::endAll(bool thoseThatMayEndLate) {
 milliseconds TransferThread::longestWait() const {
   constexpr milliseconds kUntilWoken = std::chrono::hours(1);
   if (!stopBy_) return kUntilWoken;
+  if (open_.empty()) return milliseconds(0);
   const auto left = std::chrono::ceil<milliseconds>(*stopBy_ - steady_clock::now());
   return std::clamp(left, milliseconds(0), kUntilWoken);
 }
