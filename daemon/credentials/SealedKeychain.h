@@ -7,7 +7,7 @@
 #include <mutex>
 #include <optional>
 #include <string>
-#include <utility>
+#include <tuple>
 
 #include "base/Result.h"
 #include "daemon/credentials/SealingKey.h"
@@ -58,7 +58,13 @@ class SealedKeychain : public RVDKeychainManager {
   void requestEnded(const std::shared_ptr<requests::RequestContext>& request);
 
  private:
-  using Place = std::pair<std::string, std::optional<std::string>>;  // account and client ID
+  struct Place {
+    std::string accountId;
+    std::optional<std::string> clientId;
+    friend bool operator<(const Place& a, const Place& b) {
+      return std::tie(a.accountId, a.clientId) < std::tie(b.accountId, b.clientId);
+    }
+  };
 
   SealedKeychain(records::Database& database, SealingKey key, RVLogService& log);
   base::Result<void> store(const Place& place, const RVAccountCredential& credential);

@@ -39,8 +39,7 @@ class SealingKey {
   };
   using Bytes = std::unique_ptr<unsigned char[], Free>;
 
-  explicit SealingKey(Bytes bytes)
-      : bytes_(std::move(bytes)) {}
+  explicit SealingKey(Bytes bytes);
 
   Bytes bytes_;
 };

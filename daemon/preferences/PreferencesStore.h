@@ -41,6 +41,7 @@ class PreferencesStore : public ZQPreferences {
   using Cached = std::map<std::string, std::optional<RVValue>, std::less<>>;
 
   base::Result<RVDictionary> load();
+  base::Result<std::optional<RVValue>> read(std::string_view applicationId, std::string_view key);
   base::Result<void> change(std::string_view applicationId,
                             const std::function<void(RVDictionary& application)>& edit);
 

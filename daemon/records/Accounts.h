@@ -1,8 +1,6 @@
 // The accounts that were set up on the device.
 #pragma once
 
-#include <cstdint>
-#include <functional>
 #include <memory>
 #include <mutex>
 #include <optional>
@@ -44,6 +42,8 @@ class Accounts {
 
  private:
   Accounts(Database& database, state::IdentifierSource newIdentifier);
+  base::Result<void> reload();
+  base::Result<void> write(const Database::Work& work);
 
   Database& database_;
   const state::IdentifierSource newIdentifier_;

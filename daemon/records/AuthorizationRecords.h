@@ -1,7 +1,6 @@
 // What was decided about each client's access.
 #pragma once
 
-#include <chrono>
 #include <functional>
 #include <map>
 #include <memory>
@@ -13,21 +12,12 @@
 #include <vector>
 
 #include "base/Result.h"
+#include "daemon/records/AuthorizationRecord.h"
 #include "daemon/records/Database.h"
 #include "daemon/state/Clock.h"
 #include "host/RVLog.h"
-#include "host/Values.h"
 
 namespace records {
-
-struct AuthorizationRecord {
-  std::string accountType;
-  std::string clientId;
-  bool granted = false;
-  std::optional<RVPermissionSet> permissions;
-  std::optional<RVDictionary> options;
-  std::chrono::sys_seconds changed{};
-};
 
 // Reads come from memory and never wait for the disk; a write is on the disk when it returns. Thread-safe.
 class AuthorizationRecords {
@@ -58,10 +48,15 @@ class AuthorizationRecords {
  private:
   using OfType = std::map<std::string, AuthorizationRecord, std::less<>>;
 
-  AuthorizationRecords(Database& database, state::Clock clock);
-  void announce(const std::string& accountType) const;
+  AuthorizationRecords(Database& database, RVLogService& log, state::Clock clock);
+  base::Result<void> reload();
+  // Runs the work and, where it succeeded, lets memory follow.
+  base::Result<void> write(const std::string& accountType,
+                           const Database::Work& work,
+                           const std::function<void(OfType& ofType)>& follow);
 
   Database& database_;
+  RVLogService& log_;
   const state::Clock clock_;
   std::function<void(const std::string&)> listener_;
   std::mutex writes_;  // held from before a write until memory shows it

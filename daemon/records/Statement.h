@@ -18,6 +18,10 @@ struct Blob {
   std::string bytes;
 };
 
+// What went wrong, in SQLite's words. code: SQLite's, extended or not; kDamaged where the file is no sound
+// database. connection: may be null.
+base::Failure databaseFailure(sqlite3* connection, int code);
+
 // A prepared statement in use; reset and given back for the next use when this object goes. Parameters are
 // bound in order, the first call being ?1. A failure to bind shows at the next step. Used only within the
 // Database call that handed it out.
@@ -29,6 +33,7 @@ class Statement {
   ~Statement();
 
   Statement& bind(std::string_view text);
+  Statement& bind(const std::string& text) { return bind(std::string_view(text)); }
   Statement& bind(const std::optional<std::string>& text);  // absent: NULL
   Statement& bind(std::int64_t number);
   Statement& bind(const Blob& blob);

@@ -14,7 +14,8 @@
 namespace state {
 
 // The state directory, held by one process at a time: a second one that opens it is refused until this
-// object goes. Thread-safe. File names are plain names, without a slash.
+// object goes. Thread-safe, but two writes to one file name must not overlap. File names are plain names,
+// without a slash.
 class Directory {
  public:
   // Opens the directory, making it and its missing parents with mode 0700. Refused (kRefused, with what to
@@ -25,26 +26,24 @@ class Directory {
   // Absolute, free of symbolic links.
   const std::filesystem::path& path() const { return path_; }
 
-  // Whether the file may be trusted: a regular file of ours with a single name and mode 0600. False where
-  // there is none; kRefused, with what to do about it, where there is something else.
+  // Whether there is such a file. kRefused, with what to do about it, where what is there cannot be trusted:
+  // it is no regular file, it belongs to somebody else, it has a second name, or others can get at it.
   base::Result<bool> checkFile(const std::string& name) const;
 
-  // The content of a file that checkFile lets pass; absent where there is none. kInvalid where it is longer
-  // than `limit` bytes.
+  // Opens a file for reading that checkFile lets pass; absent where there is none.
+  base::Result<std::optional<base::FileDescriptor>> openFile(const std::string& name) const;
+
+  // The content of such a file. kInvalid where it is longer than `limit` bytes.
   base::Result<std::optional<std::string>> readFile(const std::string& name, std::size_t limit) const;
 
-  // Makes a new file of mode 0600 with this content, durable when it returns. Fails where the name is
-  // taken.
-  base::Result<void> createFile(const std::string& name, std::string_view content) const;
-
-  // Puts this content in place of the file's, or makes the file; durable when it returns. Whatever happens,
-  // the file has either its old content or the new.
+  // Puts this content in place of the file's, or makes the file, with mode 0600; durable when it returns.
+  // Whatever happens, the file has either its old content or the new.
   base::Result<void> replaceFile(const std::string& name, std::string_view content) const;
 
   // Gives a file the first free name of `name`.damaged-1, -2 and so on, and answers which.
   base::Result<std::string> setAside(const std::string& name) const;
 
-  // Renames over what may be there, durable when it returns.
+  // Renames over what may be there; durable when it returns.
   base::Result<void> rename(const std::string& from, const std::string& to) const;
 
   // No such file is a success.
@@ -52,7 +51,8 @@ class Directory {
 
  private:
   Directory(std::filesystem::path path, base::FileDescriptor directory, base::FileDescriptor lock);
-  base::Result<void> flush() const;
+  base::Result<void> writeFile(const std::string& name, std::string_view content) const;
+  base::Failure failure(const std::string& name, const char* action) const;
 
   const std::filesystem::path path_;
   const base::FileDescriptor directory_;

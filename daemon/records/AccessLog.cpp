@@ -1,0 +1,70 @@
+#include "daemon/records/AccessLog.h"
+
+#include <utility>
+
+#include "daemon/log/Log.h"
+#include "daemon/requests/RequestContext.h"
+
+namespace records {
+
+AccessLog::AccessLog(Database& database, RVLogService& log, state::Clock clock)
+    : database_(database),
+      log_(log),
+      clock_(std::move(clock)) {
+}
+
+void AccessLog::RVDLogAccessRequest(std::string_view accountTypeIdentifier,
+                                    const std::optional<std::string>& clientID,
+                                    bool granted,
+                                    bool requested,
+                                    double /*elapsed*/) {
+  const auto write = [&] {
+    const auto done = database_.write([&](Connection& connection) -> base::Result<void> {
+      auto added = connection.run(
+          "INSERT INTO access_log (time, account_type, client_id, granted, requested) "
+          "VALUES (?1, ?2, ?3, ?4, ?5)",
+          std::int64_t{clock_().time_since_epoch().count()},
+          accountTypeIdentifier,
+          clientID,
+          std::int64_t{granted},
+          std::int64_t{requested});
+      if (!added) return added;
+      return connection.run(
+          "DELETE FROM access_log WHERE number <= (SELECT max(number) FROM access_log) - ?1",
+          kAccessLogEntries);
+    });
+    if (!done)
+      logging::error(log_, "An access decision could not be logged: %@", {RVValue(done.failure().message)});
+  };
+  const auto request = requests::RequestContext::current();
+  if (request == nullptr) {
+    write();
+  } else {
+    request->unlessVoid(write);
+  }
+}
+
+base::Result<std::vector<AccessLogEntry>> AccessLog::newest(std::uint32_t limit) const {
+  std::vector<AccessLogEntry> entries;
+  const auto done = database_.read([&](Connection& connection) -> base::Result<void> {
+    auto statement = connection.prepare(
+        "SELECT time, account_type, client_id, granted, requested "
+        "FROM access_log ORDER BY number DESC LIMIT ?1");
+    if (!statement) return statement.failure();
+    (*statement)->bind(std::int64_t{limit});
+    for (;;) {
+      const auto row = (*statement)->step();
+      if (!row) return row.failure();
+      if (!*row) return {};
+      entries.push_back({std::chrono::sys_seconds(std::chrono::seconds((*statement)->number(0))),
+                         (*statement)->text(1),
+                         (*statement)->optionalText(2),
+                         (*statement)->number(3) != 0,
+                         (*statement)->number(4) != 0});
+    }
+  });
+  if (!done) return done.failure();
+  return entries;
+}
+
+}  // namespace records

@@ -1,0 +1,120 @@
+#include "daemon/records/Schema.h"
+
+#include <sqlite3.h>
+
+#include <array>
+#include <string>
+#include <vector>
+
+namespace records {
+namespace {
+
+constexpr std::array<const char*, kSchemaVersion> kMigrations = {
+    // To version 1.
+    R"(
+CREATE TABLE accounts (
+  number INTEGER PRIMARY KEY,
+  identifier TEXT NOT NULL UNIQUE,
+  account_type TEXT NOT NULL,
+  username TEXT NOT NULL
+) STRICT;
+CREATE TABLE authorizations (
+  account_type TEXT NOT NULL,
+  client_id TEXT NOT NULL,
+  granted INTEGER NOT NULL CHECK (granted IN (0, 1)),
+  permissions TEXT,
+  options TEXT,
+  changed INTEGER NOT NULL,
+  digest BLOB NOT NULL,
+  PRIMARY KEY (account_type, client_id)
+) STRICT, WITHOUT ROWID;
+CREATE TABLE access_log (
+  number INTEGER PRIMARY KEY,
+  time INTEGER NOT NULL,
+  account_type TEXT NOT NULL,
+  client_id TEXT,
+  granted INTEGER NOT NULL CHECK (granted IN (0, 1)),
+  requested INTEGER NOT NULL CHECK (requested IN (0, 1))
+) STRICT;
+CREATE TABLE credentials (
+  account TEXT NOT NULL REFERENCES accounts (identifier) ON DELETE CASCADE,
+  client_id TEXT,
+  sealed BLOB NOT NULL
+) STRICT;
+CREATE UNIQUE INDEX credentials_of_clients ON credentials (account, client_id);
+CREATE UNIQUE INDEX credentials_of_accounts ON credentials (account) WHERE client_id IS NULL;
+CREATE TABLE intents (
+  number INTEGER PRIMARY KEY,
+  kind INTEGER NOT NULL CHECK (kind IN (1, 2, 3)),
+  account_type TEXT NOT NULL,
+  subject TEXT NOT NULL
+) STRICT;
+)",
+};
+
+using Tables = std::vector<std::string>;
+
+base::Result<Tables> tables(Connection& connection) {
+  auto statement = connection.prepare(
+      "SELECT type || ' ' || name || ' ' || tbl_name || ' ' || "
+      "coalesce(sql, '') FROM sqlite_schema ORDER BY 1");
+  if (!statement) return statement.failure();
+  Tables found;
+  for (;;) {
+    const auto row = (*statement)->step();
+    if (!row) return row.failure();
+    if (!*row) return found;
+    found.push_back((*statement)->text(0));
+  }
+}
+
+base::Result<void> checkTables(Connection& connection) {
+  auto model = Connection::open(":memory:");
+  if (!model) return model.failure();
+  if (auto migrated = migrate(*model, 0); !migrated) return migrated;
+  const auto expected = tables(*model);
+  const auto found = tables(connection);
+  if (!expected) return expected.failure();
+  if (!found) return found.failure();
+  if (*found != *expected) return base::Failure{base::FailureKind::kDamaged, "its tables are not ours"};
+  return {};
+}
+
+}  // namespace
+
+base::Result<std::int64_t> schemaVersion(Connection& connection) {
+  auto statement = connection.prepare("PRAGMA user_version");
+  if (!statement) return statement.failure();
+  const auto row = (*statement)->step();
+  if (!row) return row.failure();
+  return (*statement)->number(0);
+}
+
+base::Result<void> migrate(Connection& connection, std::int64_t from) {
+  for (std::int64_t version = from; version < kSchemaVersion; ++version) {
+    const std::string script = std::string("BEGIN IMMEDIATE;") + kMigrations.at(version) +
+                               "PRAGMA user_version = " + std::to_string(version + 1) + ";COMMIT;";
+    if (auto done = connection.execute(script); !done) return done;
+  }
+  return {};
+}
+
+base::Result<void> checkSoundness(Connection& connection) {
+  const base::FailureKind damaged = base::FailureKind::kDamaged;
+  {
+    auto statement = connection.prepare("PRAGMA integrity_check(1)");
+    if (!statement) return statement.failure();
+    const auto row = (*statement)->step();
+    if (!row) return row.failure();
+    if ((*statement)->text(0) != "ok") return base::Failure{damaged, (*statement)->text(0)};
+  }
+  if (auto checked = checkTables(connection); !checked) return checked;
+  auto statement = connection.prepare("PRAGMA foreign_key_check");
+  if (!statement) return statement.failure();
+  const auto row = (*statement)->step();
+  if (!row) return row.failure();
+  if (*row) return base::Failure{damaged, "a credential belongs to no account"};
+  return {};
+}
+
+}  // namespace records
