@@ -82,6 +82,8 @@ class Services final : RVDKeychainManager,
     return {this, this, this, this, this, this, this, &table, this, this};
   }
 
+  RVLogService& log() { return *this; }
+
  private:
   class Request final : public TKFacebookAuthorizationRequest, public TKFacebookPermissionDescriptionRequest {
    public:

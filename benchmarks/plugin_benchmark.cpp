@@ -28,7 +28,7 @@ namespace {
 
 struct Setting {
   Setting()
-      : words(BUNDLE, {"en"}, nothing.log()),
+      : words(BUNDLE "/resources", {}, nothing.log()),
         plugin(nothing.with(words)) {}
 
   static RVDictionary options(const RVPermissionSet& permissions) {
