@@ -1,0 +1,5 @@
+pkg_check_modules(ICU REQUIRED IMPORTED_TARGET icu-uc)
+rvd_test(clients_tests
+  SOURCES unit/clients_applications_test.cpp unit/clients_directory_test.cpp
+          unit/clients_identities_test.cpp unit/clients_names_test.cpp
+  LIBRARIES rvd_clients rvd_fakes PkgConfig::ICU)
