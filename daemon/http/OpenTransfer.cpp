@@ -245,9 +245,11 @@ std::string OpenTransfer::trustProblem(CURLcode result) const {
   if (result == CURLE_SSL_CACERT_BADFILE)
     return "the file of trusted authorities cannot be read: " + transfer_.caFile;
   if (result != CURLE_PEER_FAILED_VERIFICATION) return curl_easy_strerror(result);
-  long verification = X509_V_OK;
+  // libcurl leaves it as unspecified where the certificate is good, and its host is not.
+  long verification = X509_V_ERR_UNSPECIFIED;
   curl_easy_getinfo(handle_.get(), CURLINFO_SSL_VERIFYRESULT, &verification);
-  if (verification == X509_V_OK) return "its certificate is for another host";
+  if (verification == X509_V_OK || verification == X509_V_ERR_UNSPECIFIED)
+    return "its certificate is for another host";
   return X509_verify_cert_error_string(verification);
 }
 
