@@ -46,7 +46,7 @@ class FakeStringTable final : public RVStringTable, public Fake {
   std::vector<Lookup> lookups_;
 };
 
-// Reads strictly: UTF-8, no repeated keys, nothing after the document, at most 1 MiB and 64 levels.
+// Reads as the daemon's own reader does, until it is told otherwise.
 class FakeJSONReader final : public RVJSONReader, public Fake {
  public:
   FakeJSONReader();

@@ -10,4 +10,4 @@ add_library(rvd_fakes STATIC
   ${CMAKE_CURRENT_LIST_DIR}/FakePreferences.cpp
   ${CMAKE_CURRENT_LIST_DIR}/FakeTexts.cpp
   ${CMAKE_CURRENT_LIST_DIR}/FakeUserNotifications.cpp)
-target_link_libraries(rvd_fakes PUBLIC rvd_log Threads::Threads)
+target_link_libraries(rvd_fakes PUBLIC rvd_log rvd_json Threads::Threads)
