@@ -1,0 +1,289 @@
+#include "daemon/Daemon.h"
+
+#include <sdbus-c++/sdbus-c++.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <exception>
+#include <utility>
+
+#include "daemon/alerts/AlertService.h"
+#include "daemon/bus/AccountsService.h"
+#include "daemon/bus/AgentConnections.h"
+#include "daemon/bus/AgentManagerService.h"
+#include "daemon/bus/BusLoop.h"
+#include "daemon/bus/Dispatcher.h"
+#include "daemon/bus/ManagementService.h"
+#include "daemon/bus/Names.h"
+#include "daemon/bus/Senders.h"
+#include "daemon/credentials/SealedKeychain.h"
+#include "daemon/http/FacebookRequests.h"
+#include "daemon/http/JSONReader.h"
+#include "daemon/http/TransferThread.h"
+#include "daemon/log/Log.h"
+#include "daemon/preferences/NotificationCenter.h"
+#include "daemon/preferences/PreferencesStore.h"
+#include "daemon/preferences/SerialQueues.h"
+#include "daemon/records/Account.h"
+#include "daemon/records/Intents.h"
+#include "daemon/requests/WaitingLimits.h"
+#include "daemon/state/Clock.h"
+#include "daemon/state/Directory.h"
+#include "daemon/state/RandomIdentifier.h"
+
+namespace rvd {
+namespace {
+
+// Threads for calls that do not wait.
+constexpr std::size_t kRunningThreads = 4;
+// Threads beyond those for what the user's own tools have the daemon wait for, which no limit counts.
+constexpr std::size_t kThreadsForTools = 16;
+constexpr std::chrono::seconds kKeepIdleThreads{10};
+
+// The languages as the header Accept-Language lists them: best first, each a little less wanted.
+std::string acceptLanguage(const std::vector<std::string>& languages) {
+  std::vector<std::string> tags;
+  const auto add = [&](std::string tag) {
+    std::replace(tag.begin(), tag.end(), '_', '-');
+    if (std::find(tags.begin(), tags.end(), tag) == tags.end()) tags.push_back(std::move(tag));
+  };
+  for (const std::string& language : languages) add(language.substr(0, language.find('@')));
+  add("en");
+  std::string header;
+  int tenths = 10;
+  for (const std::string& tag : tags) {
+    if (!header.empty()) header += ", ";
+    header += tag;
+    if (tenths < 10) header += ";q=0." + std::to_string(tenths);
+    tenths = std::max(tenths - 1, 1);
+  }
+  return header;
+}
+
+// The token of the account that plug-ins work with: the first one of the type.
+std::optional<RVSecret> masterToken(records::Accounts& accounts, RVDKeychainManager& keychain) {
+  const auto list = accounts.listOfType(RVAccountTypeIdentifierFacebook);
+  if (list.empty()) return std::nullopt;
+  const auto credential =
+      keychain.credentialForAccount(records::Account(list.front(), nullptr), std::nullopt);
+  if (credential == nullptr) return std::nullopt;
+  return credential->oauthToken();
+}
+
+}  // namespace
+
+// What lasts.
+struct Daemon::Storage {
+  std::unique_ptr<state::Directory> directory;
+  std::unique_ptr<records::Database> database;
+  std::unique_ptr<records::Accounts> accounts;
+  std::unique_ptr<records::AuthorizationRecords> records;
+  std::unique_ptr<records::AccessLog> accessLog;
+  std::unique_ptr<records::Intents> intents;
+  std::unique_ptr<credentials::SealedKeychain> keychain;
+  std::unique_ptr<preferences::PreferencesStore> preferences;
+};
+
+// The connection and those who are on it.
+struct Daemon::Bus {
+  Bus(const Places& places, RVLogService& log, int stopDescriptor)
+      : connection(sdbus::createSessionBusConnection()),
+        loop(*connection, stopDescriptor),
+        senders(*connection),
+        agents(*connection, loop),
+        applications(places.applicationDirectories, places.languages),
+        entitlements(places.entitlementsDirectory, places.entitlementsTrust, log),
+        clients(applications, entitlements, "An unknown application"),
+        identities(senders, applications, ::geteuid()) {}
+
+  const std::unique_ptr<sdbus::IConnection> connection;
+  bus::BusLoop loop;
+  bus::Senders senders;
+  bus::AgentConnections agents;
+  const clients::InstalledApplications applications;
+  const config::Entitlements entitlements;
+  const clients::ClientDirectory clients;
+  clients::Identities identities;
+};
+
+// What answers requests.
+struct Daemon::Work {
+  Work(const Places& places, const config::Settings& settings, Storage& storage, Bus& bus, RVLogService& log)
+      : queues(log),
+        transfers(log),
+        facebookRequests(
+            transfers,
+            {settings.serverURL, settings.transferTimeout, settings.caFile.value_or("")},
+            [&storage] { return masterToken(*storage.accounts, *storage.keychain); },
+            acceptLanguage(places.languages),
+            log),
+        alerts(bus.agents, state::randomIdentifier, alerts::AlertService::growingPause),
+        pool(kRunningThreads,
+             kRunningThreads + settings.waitingRequests + kThreadsForTools,
+             kKeepIdleThreads),
+        table(pool,
+              {[&log](const std::string& reason) {
+                 logging::error(log, "A plug-in's call failed: %@", {reason});
+               },
+               [&storage](const auto& request) { storage.keychain->requestEnded(request); }}) {}
+
+  preferences::NotificationCenter notifications;
+  preferences::SerialQueues queues;
+  http::JSONReader jsonReader;
+  http::TransferThread transfers;
+  http::FacebookRequests facebookRequests;
+  alerts::AlertService alerts;
+  requests::RequestPool pool;
+  requests::RequestTable table;
+  std::vector<std::unique_ptr<plugins::PluginModule>> plugins;
+
+  std::unique_ptr<sdbus::IObject> object;
+  std::unique_ptr<bus::Dispatcher> dispatcher;
+  std::unique_ptr<bus::AccountsService> accountsService;
+  std::unique_ptr<bus::ManagementService> managementService;
+  std::unique_ptr<bus::AgentManagerService> agentManagerService;
+};
+
+Daemon::Daemon(const config::Settings& settings, RVLogService& log)
+    : settings_(settings),
+      log_(log) {
+}
+
+Daemon::~Daemon() {
+  if (work_ != nullptr) stop();
+}
+
+base::Result<std::unique_ptr<Daemon>> Daemon::start(const Places& places,
+                                                    const config::Settings& settings,
+                                                    RVLogService& log,
+                                                    int stopDescriptor) {
+  std::unique_ptr<Daemon> daemon(new Daemon(settings, log));
+  if (auto opened = daemon->openStorage(places); !opened) return opened.failure();
+  try {
+    daemon->bus_ = std::make_unique<Bus>(places, log, stopDescriptor);
+    daemon->work_ = std::make_unique<Work>(places, settings, *daemon->storage_, *daemon->bus_, log);
+    daemon->serve(places);
+  } catch (const std::exception& exception) {
+    return base::Failure{base::FailureKind::kFailed,
+                         std::string("The session bus cannot be served: ") + exception.what()};
+  }
+  return daemon;
+}
+
+base::Result<void> Daemon::openStorage(const Places& places) {
+  if (settings_.credentialStore != config::CredentialStore::kSealed)
+    return base::Failure{base::FailureKind::kInvalid,
+                         "The only store for credentials that this rvd offers is \"sealed\""};
+  storage_ = std::make_unique<Storage>();
+  Storage& storage = *storage_;
+  const auto keep = [](auto& place, auto result) -> base::Result<void> {
+    if (!result) return result.failure();
+    place = *std::move(result);
+    return {};
+  };
+  using records::AuthorizationRecords;
+  if (auto kept = keep(storage.directory, state::Directory::open(places.stateDirectory)); !kept) return kept;
+  if (auto kept = keep(storage.database, records::Database::open(*storage.directory, log_)); !kept)
+    return kept;
+  records::Database& database = *storage.database;
+  if (auto kept = keep(storage.accounts, records::Accounts::load(database, state::randomIdentifier)); !kept)
+    return kept;
+  if (auto kept = keep(storage.records, AuthorizationRecords::load(database, log_, state::systemTime)); !kept)
+    return kept;
+  if (auto kept =
+          keep(storage.keychain,
+               credentials::SealedKeychain::open(database, *storage.directory, places.sealingKey, log_));
+      !kept)
+    return kept;
+  storage.accessLog = std::make_unique<records::AccessLog>(database, log_, state::systemTime);
+  storage.intents = std::make_unique<records::Intents>(database);
+  storage.preferences = std::make_unique<preferences::PreferencesStore>(*storage.directory, log_);
+  if (auto done = storage.intents->completeInterrupted(*storage.records, *storage.accounts, log_); !done)
+    return done;
+  return storage.keychain->reconcile();
+}
+
+void Daemon::serve(const Places& places) {
+  Storage& storage = *storage_;
+  Work& work = *work_;
+  work.plugins = plugins::loadPlugins(places.pluginDirectory,
+                                      {storage.keychain.get(),
+                                       &work.facebookRequests,
+                                       &work.alerts,
+                                       storage.preferences.get(),
+                                       &work.queues,
+                                       &work.notifications,
+                                       &work.jsonReader,
+                                       nullptr,
+                                       &log_,
+                                       storage.accessLog.get()},
+                                      places.languages);
+
+  work.object = sdbus::createObject(*bus_->connection, bus::kObjectPath);
+  work.dispatcher = std::make_unique<bus::Dispatcher>(
+      *work.object, bus_->loop, bus_->senders, bus_->identities, work.pool, log_);
+  const bus::Parts parts{log_,
+                         settings_,
+                         *storage.accounts,
+                         *storage.records,
+                         *storage.accessLog,
+                         *storage.intents,
+                         *storage.keychain,
+                         *storage.preferences,
+                         work.notifications,
+                         bus_->identities,
+                         bus_->clients,
+                         work.plugins,
+                         work.pool,
+                         work.table,
+                         std::make_shared<requests::WaitingLimits>(
+                             work.pool, settings_.waitingRequestsPerClient, settings_.waitingRequests),
+                         std::make_shared<requests::UnlimitedWaiting>(work.pool)};
+  work.accountsService =
+      std::make_unique<bus::AccountsService>(*work.object, *work.dispatcher, bus_->loop, parts);
+  work.managementService = std::make_unique<bus::ManagementService>(
+      *work.object, *work.dispatcher, bus_->loop, *work.accountsService, parts);
+  work.agentManagerService =
+      std::make_unique<bus::AgentManagerService>(*work.dispatcher, bus_->agents, work.alerts);
+  work.object->finishRegistration();
+
+  bus_->connection->addMatch(
+      "type='signal',sender='org.freedesktop.DBus',interface='org.freedesktop.DBus',member='"
+      "NameOwnerChanged'",
+      [this](sdbus::Message& message) {
+        std::string name;
+        std::string oldOwner;
+        std::string newOwner;
+        message >> name >> oldOwner >> newOwner;
+        if (newOwner.empty() && name.starts_with(':')) connectionLeft(name);
+      },
+      sdbus::floating_slot);
+  bus_->connection->requestName(bus::kServiceName);
+}
+
+void Daemon::connectionLeft(const std::string& uniqueName) {
+  bus_->senders.forget(uniqueName);
+  bus_->identities.forget(uniqueName);
+  work_->accountsService->callerLeft(uniqueName);
+  work_->table.callerLeft(uniqueName);
+  work_->alerts.agentsLeft(uniqueName);
+  bus_->agents.removeAllOf(uniqueName);
+}
+
+bool Daemon::run() {
+  const auto end = bus_->loop.run();
+  if (end == bus::BusLoop::End::kBusLost) logging::error(log_, "The session bus is gone");
+  stop();
+  return end == bus::BusLoop::End::kStopped;
+}
+
+void Daemon::stop() {
+  // Requests that come now are void from the start. What waits for the user or the server stops waiting, so
+  // the pool's threads can end; revocations are given a moment to reach the server.
+  const auto barrier = work_->table.makeVoid(requests::VoidReason::kStopping,
+                                             [](const requests::RequestKey&) { return true; });
+  work_->pool.stop();
+  work_->transfers.stop(http::kRevocationGrace);
+}
+
+}  // namespace rvd

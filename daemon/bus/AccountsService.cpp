@@ -1,0 +1,215 @@
+#include "daemon/bus/AccountsService.h"
+
+#include <sdbus-c++/sdbus-c++.h>
+
+#include <utility>
+
+#include "daemon/bus/Answers.h"
+#include "daemon/bus/Names.h"
+#include "daemon/bus/Values.h"
+#include "host/Constants.h"
+#include "interfaces/Accounts1Methods.h"
+
+namespace bus {
+namespace {
+
+constexpr std::uint32_t kVersion = 1;
+
+// What an alert tells about the client, by the keys of Agent1's description.
+RVDictionary detailsOf(const clients::Client& client) {
+  RVDictionary details;
+  if (const auto id = client.bundleID()) details.emplace("client_id", *id);
+  if (!client.icon().empty()) details.emplace("icon", client.icon());
+  details.emplace("evidence", clients::evidenceText(client.evidence()));
+  return details;
+}
+
+// Writes a secret as a variant; no copy of it stays behind on our side.
+void writeSecret(sdbus::Message& message, const RVSecret& secret) {
+  std::string text(secret.reveal());
+  message.openVariant("s");
+  try {
+    message << text;
+  } catch (...) {
+    RVSecret::wipe(text.data(), text.size());
+    throw;
+  }
+  RVSecret::wipe(text.data(), text.size());
+  message.closeVariant();
+}
+
+void writeCredential(sdbus::Message& message, const RVAccountCredential& credential) {
+  message.openContainer("{sv}");
+  const auto entry = [&](const char* key, const auto& writeValue) {
+    message.openDictEntry("sv");
+    message << key;
+    writeValue();
+    message.closeDictEntry();
+  };
+  entry("oauth_token", [&] { writeSecret(message, credential.oauthToken()); });
+  entry("refresh_token", [&] { writeSecret(message, credential.refreshToken()); });
+  if (credential.expiryDate() != kRVDistantFuture)
+    entry("expiry_date",
+          [&] { writeVariant(message, std::int64_t{credential.expiryDate().time_since_epoch().count()}); });
+  message.closeContainer();
+}
+
+}  // namespace
+
+AccountsService::AccountsService(sdbus::IObject& object, Dispatcher& dispatcher, BusLoop& loop, Parts parts)
+    : object_(object),
+      dispatcher_(dispatcher),
+      loop_(loop),
+      parts_(std::move(parts)) {
+  using SharedCall = const std::shared_ptr<Call>&;
+  dispatcher.serve(interfaces::kAccounts1,
+                   interfaces::methodsOfAccounts1(),
+                   {{"Register", [this](SharedCall call) { registerCaller(call); }},
+                    {"RequestAccess", [this](SharedCall call) { requestAccess(call); }},
+                    {"GetAccess", [this](SharedCall call) { getAccess(call); }},
+                    {"GetCredential", [this](SharedCall call) { getCredential(call); }}});
+  object.registerSignal("AccessChanged")
+      .onInterface(interfaces::kAccounts1)
+      .withParameters<std::string>("account_type");
+  object.registerProperty("AccountTypes").onInterface(interfaces::kAccounts1).withGetter([this] {
+    std::vector<std::string> types;
+    const std::string facebook(RVAccountTypeIdentifierFacebook);
+    for (const auto& module : parts_.plugins)
+      if (types.empty() && module->supportsAccountType(facebook)) types.push_back(facebook);
+    return types;
+  });
+  object.registerProperty("Version").onInterface(interfaces::kAccounts1).withGetter([] { return kVersion; });
+}
+
+void AccountsService::registerCaller(const std::shared_ptr<Call>& call) {
+  SizeLimit limit{parts_.settings.messageBytes};
+  const std::string id = readString(call->message(), limit);
+  switch (parts_.identities.registerAs(call->sender(), id)) {
+    case clients::Registration::kRegistered:
+      break;
+    case clients::Registration::kOtherUser:
+      throw sdbus::Error(kAccessDenied, "Only the user whose accounts these are may call");
+    case clients::Registration::kAlreadyIdentified:
+      throw sdbus::Error(kAlreadyIdentified, "It is known which application this connection is");
+    case clients::Registration::kUnknownApplication:
+      throw sdbus::Error(kUnknownApplication, "No installed application has this ID");
+  }
+  {
+    const std::lock_guard lock(mutex_);
+    connections_[id].insert(call->sender());
+  }
+  call->reply();
+}
+
+void AccountsService::checkSizes(const RVDictionary& options) const {
+  const auto& settings = parts_.settings;
+  const auto checkName = [&](const RVValue& value) {
+    if (value.string() != nullptr && value.string()->size() > settings.nameBytes)
+      throw sdbus::Error(kLimitsExceeded, "A name in the options is too long");
+  };
+  for (const auto& [key, value] : options) {
+    if (key != RVFacebookPermissionsKey) {
+      checkName(value);
+    } else if (const RVArray* permissions = value.array()) {
+      if (permissions->size() > settings.permissionsPerRequest)
+        throw sdbus::Error(kLimitsExceeded, "There are too many permissions");
+      for (const RVValue& permission : *permissions) checkName(permission);
+    }
+  }
+}
+
+void AccountsService::requestAccess(const std::shared_ptr<Call>& call) {
+  SizeLimit limit{parts_.settings.messageBytes};
+  std::string accountType = readString(call->message(), limit);
+  auto options = std::make_shared<const RVDictionary>(readOptions(
+      call->message(), limit, {RVFacebookAppIdKey, RVFacebookPermissionsKey, RVFacebookAudienceKey}));
+  const bool allowUserInteraction = readBoolean(call->message(), limit);
+  checkSizes(*options);
+  auto& plugin = pluginForAccountType(parts_, accountType);
+  const auto client = clientOfConnection(parts_, call->sender());
+  const auto id = client->bundleID();
+
+  auto work = [this,
+               &plugin,
+               client,
+               options,
+               allowUserInteraction,
+               type = std::make_shared<const RVAccountType>(accountType)](RVDAccessCompletion completion) {
+    plugin.handleAccessRequestToAccountsOfType(
+        type,
+        client,
+        *options,
+        makeStore(parts_),
+        allowUserInteraction,
+        [options, completion = std::move(completion)](bool granted, const std::optional<RVError>& error) {
+          completion(granted, error);
+        });
+  };
+  parts_.requests.submit(requests::RequestKey::forOptions(
+                             id ? clientKeyOfID(*id) : call->sender(), std::move(accountType), *options),
+                         {call->sender(), [call](const auto& outcome) { answerOutcome(*call, outcome); }},
+                         parts_.limits,
+                         detailsOf(*client),
+                         std::move(work));
+}
+
+void AccountsService::getAccess(const std::shared_ptr<Call>& call) {
+  SizeLimit limit{parts_.settings.messageBytes};
+  const std::string accountType = readString(call->message(), limit);
+  pluginForAccountType(parts_, accountType);
+  const auto id = parts_.identities.identityOf(call->sender()).application;
+  const auto record = id ? parts_.records.find(accountType, id->id) : std::nullopt;
+  call->reply([&](sdbus::MethodReply& reply) {
+    reply << (!record ? "none" : record->granted ? "granted" : "refused");
+    writeNames(reply, record ? record->permissions.value_or(RVPermissionSet()) : RVPermissionSet());
+    writeDictionary(reply, record ? record->options.value_or(RVDictionary()) : RVDictionary());
+  });
+}
+
+void AccountsService::getCredential(const std::shared_ptr<Call>& call) {
+  SizeLimit limit{parts_.settings.messageBytes};
+  const std::string accountType = readString(call->message(), limit);
+  pluginForAccountType(parts_, accountType);
+  const auto client = parts_.identities.identityOf(call->sender()).application;
+  if (!client) throw sdbus::Error(kNoAccess, "The caller holds no access");
+  dispatcher_.onPool(call, [this, call, accountType, id = client->id] {
+    const auto accounts = parts_.accounts.listOfType(accountType);
+    const auto credential =
+        accounts.empty() ? nullptr : parts_.keychain.credentialForClient(accounts.front().identifier, id);
+    if (credential == nullptr) throw sdbus::Error(kNoAccess, "The caller holds no access");
+    call->reply([&](sdbus::MethodReply& reply) { writeCredential(reply, *credential); });
+  });
+}
+
+void AccountsService::callerLeft(const std::string& uniqueName) {
+  const std::lock_guard lock(mutex_);
+  for (auto entry = connections_.begin(); entry != connections_.end();) {
+    entry->second.erase(uniqueName);
+    entry = entry->second.empty() ? connections_.erase(entry) : std::next(entry);
+  }
+}
+
+void AccountsService::accessChanged(const std::string& accountType,
+                                    const std::vector<std::string>& clientIDs) {
+  std::vector<std::string> receivers;
+  {
+    const std::lock_guard lock(mutex_);
+    for (const std::string& id : clientIDs) {
+      const auto entry = connections_.find(id);
+      if (entry == connections_.end()) continue;
+      receivers.insert(receivers.end(), entry->second.begin(), entry->second.end());
+    }
+  }
+  for (const std::string& receiver : receivers) {
+    try {
+      auto signal = object_.createSignal(interfaces::kAccounts1, "AccessChanged");
+      signal.setDestination(receiver);
+      signal << accountType;
+      object_.emitSignal(signal);
+      loop_.sendRest();
+    } catch (const sdbus::Error&) {  // The bus is gone, and the receiver with it.
+    }
+  }
+}
+
+}  // namespace bus

@@ -1,0 +1,57 @@
+// From messages to handlers.
+#pragma once
+
+#include <functional>
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "daemon/bus/BusLoop.h"
+#include "daemon/bus/Call.h"
+#include "daemon/bus/Senders.h"
+#include "daemon/clients/Identities.h"
+#include "daemon/requests/RequestPool.h"
+#include "host/RVLog.h"
+#include "interfaces/Method.h"
+
+namespace bus {
+
+// Lets through the calls of the daemon's own user alone, and sees to it that nothing that goes wrong in a
+// handler gets past it: what a handler throws becomes the call's answer.
+class Dispatcher {
+ public:
+  // Runs on the bus thread. Answers the call, or hands it on; may throw anything.
+  using Handler = std::function<void(const std::shared_ptr<Call>& call)>;
+
+  // The references outlive this object.
+  Dispatcher(sdbus::IObject& object,
+             BusLoop& loop,
+             Senders& senders,
+             clients::Identities& identities,
+             requests::RequestPool& pool,
+             RVLogService& log);
+
+  // Registers every method of the interface. Throws std::logic_error where one has no handler.
+  void serve(const std::string& interface,
+             const std::vector<interfaces::Method>& methods,
+             std::map<std::string, Handler> handlers);
+
+  // Runs the work on the pool; what it throws becomes the call's answer.
+  void onPool(const std::shared_ptr<Call>& call, std::function<void()> work);
+
+  // Runs the work here; what it throws becomes the call's answer.
+  void guarded(Call& call, const std::function<void()>& work) noexcept;
+
+ private:
+  void dispatch(sdbus::MethodCall message, const Handler& handler) noexcept;
+
+  sdbus::IObject& object_;
+  BusLoop& loop_;
+  Senders& senders_;
+  clients::Identities& identities_;
+  requests::RequestPool& pool_;
+  RVLogService& log_;
+};
+
+}  // namespace bus

@@ -1,0 +1,94 @@
+#include <sdbus-c++/sdbus-c++.h>
+
+#include <utility>
+
+#include "daemon/bus/ManagementService.h"
+#include "daemon/bus/Names.h"
+#include "daemon/bus/Token.h"
+#include "daemon/bus/Values.h"
+#include "daemon/log/Log.h"
+
+namespace bus {
+
+void ManagementService::addAccount(SharedCall call) {
+  std::string accountType;
+  std::string username;
+  sdbus::UnixFd token;
+  call->message() >> accountType >> username >> token;
+  pluginForAccountType(parts_, accountType);
+  // A request of its own, because the token may be long in coming: it ends when its caller leaves.
+  auto work = [this, call, accountType, username, token](const RVDAccessCompletion& completion) {
+    dispatcher_.guarded(*call, [&] { addAccountWithToken(*call, accountType, username, token.get()); });
+    completion(true, std::nullopt);
+  };
+  parts_.requests.submitAlone(
+      {call->sender(), "", {}, {}, {}},
+      {call->sender(), [call](const auto&) { call->fail(kFailed, "The account was not added"); }},
+      parts_.noLimits,
+      std::move(work));
+}
+
+void ManagementService::addAccountWithToken(Call& call,
+                                            const std::string& accountType,
+                                            const std::string& username,
+                                            int descriptor) {
+  const auto request = requests::RequestContext::current();
+  auto token = [&] {
+    const auto waiting = request->beginWaiting();
+    return readToken(descriptor, [&] { return !request->isVoid(); });
+  }();
+  if (!token) throwFailure(token.failure());
+  const auto account = parts_.accounts.add(accountType, username);
+  if (!account) throwFailure(account.failure());
+  if (const auto stored = parts_.keychain.setMasterCredential(account->identifier, *std::move(token));
+      !stored) {
+    // An account that cannot sign anything is of no use.
+    if (const auto removed = parts_.accounts.remove(account->identifier); !removed)
+      logging::error(parts_.log, "An account is left without its token: %@", {removed.failure().message});
+    throwFailure(stored.failure());
+  }
+  call.reply([&](sdbus::MethodReply& reply) { reply << account->identifier; });
+  announceAccounts();
+}
+
+void ManagementService::removeAccount(SharedCall call) {
+  std::string accountID;
+  call->message() >> accountID;
+  dispatcher_.onPool(call, [this, call, accountID] {
+    const auto account = parts_.accounts.find(accountID);
+    if (!account) throw sdbus::Error(kInvalidArgs, "There is no such account");
+    const std::string& accountType = account->accountType;
+    const auto begun = parts_.intents.begin({records::Intent::Kind::kRemoveAccount, accountType, accountID});
+    if (!begun) throwFailure(begun.failure());
+    const auto barrier = parts_.requests.makeVoid(
+        requests::VoidReason::kAccountRemoved,
+        [accountType](const requests::RequestKey& key) { return key.accountType == accountType; });
+    const auto clientIDs = clientsWithRecord(accountType);
+    pluginForAccountType(parts_, accountType)
+        .revokeAllAccessToAccountsOfType(std::make_shared<const RVAccountType>(accountType),
+                                         makeStore(parts_),
+                                         [](bool, const std::optional<RVError>&) {});
+    if (const auto removed = parts_.accounts.remove(accountID); !removed) throwFailure(removed.failure());
+    if (const auto finished = parts_.intents.finish(*begun); !finished)
+      logging::error(parts_.log,
+                     "An account was removed, but its removal stays noted as begun: %@",
+                     {finished.failure().message});
+    call->reply();
+    accountsService_.accessChanged(accountType, clientIDs);
+    announceAccounts();
+  });
+}
+
+void ManagementService::listAccounts(SharedCall call) {
+  call->reply([&](sdbus::MethodReply& reply) {
+    reply.openContainer("a{sv}");
+    for (const auto& account : parts_.accounts.list())
+      writeDictionary(reply,
+                      {{"id", account.identifier},
+                       {"account_type", account.accountType},
+                       {"username", account.username}});
+    reply.closeContainer();
+  });
+}
+
+}  // namespace bus

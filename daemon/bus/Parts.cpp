@@ -1,0 +1,33 @@
+#include "daemon/bus/Parts.h"
+
+#include <sdbus-c++/sdbus-c++.h>
+
+#include "daemon/bus/Names.h"
+
+namespace bus {
+
+RVDAccountAccessPlugin& pluginForAccountType(const Parts& parts, const std::string& accountType) {
+  for (const auto& module : parts.plugins)
+    if (module->supportsAccountType(accountType)) return module->plugin();
+  throw sdbus::Error(kUnsupportedAccountType, "No plug-in serves this account type");
+}
+
+std::shared_ptr<RVDAccountStore> makeStore(const Parts& parts) {
+  const auto clientForID = [&clients = parts.clients](const std::string& id) {
+    return clients.clientForID(id);
+  };
+  return std::make_shared<records::RequestStore>(
+      parts.records, parts.accounts, requests::RequestContext::current(), clientForID, parts.log);
+}
+
+std::shared_ptr<const clients::Client> clientOfConnection(const Parts& parts, const std::string& uniqueName) {
+  const auto identity = parts.identities.identityOf(uniqueName);
+  if (!identity.application) return parts.clients.unknownClient();
+  return parts.clients.clientForIdentity(*identity.application, identity.evidence);
+}
+
+std::string clientKeyOfID(std::string_view id) {
+  return "id " + std::string(id);  // a unique name never begins like this
+}
+
+}  // namespace bus

@@ -1,0 +1,60 @@
+// What the services on the bus work with.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "daemon/clients/Client.h"
+#include "daemon/clients/Identities.h"
+#include "daemon/config/Settings.h"
+#include "daemon/credentials/SealedKeychain.h"
+#include "daemon/plugins/PluginModule.h"
+#include "daemon/preferences/NotificationCenter.h"
+#include "daemon/preferences/PreferencesStore.h"
+#include "daemon/records/AccessLog.h"
+#include "daemon/records/Accounts.h"
+#include "daemon/records/AuthorizationRecords.h"
+#include "daemon/records/Intents.h"
+#include "daemon/records/RequestStore.h"
+#include "daemon/requests/RequestPool.h"
+#include "daemon/requests/RequestTable.h"
+#include "daemon/requests/WaitingLimits.h"
+#include "host/RVLog.h"
+
+namespace bus {
+
+// Everything outlives the services.
+struct Parts {
+  RVLogService& log;
+  const config::Settings& settings;
+  records::Accounts& accounts;
+  records::AuthorizationRecords& records;
+  records::AccessLog& accessLog;
+  records::Intents& intents;
+  credentials::SealedKeychain& keychain;
+  preferences::PreferencesStore& preferences;
+  preferences::NotificationCenter& notifications;
+  clients::Identities& identities;
+  const clients::ClientDirectory& clients;
+  const std::vector<std::unique_ptr<plugins::PluginModule>>& plugins;
+  requests::RequestPool& pool;
+  requests::RequestTable& requests;
+  std::shared_ptr<requests::WaitingLimiter> limits;
+  std::shared_ptr<requests::WaitingLimiter> noLimits;
+};
+
+// The plug-in that serves the account type. Throws sdbus::Error (UnsupportedAccountType) where none does.
+RVDAccountAccessPlugin& pluginForAccountType(const Parts& parts, const std::string& accountType);
+
+// What a plug-in is given for one call; it belongs to the calling thread's current request, if any.
+std::shared_ptr<RVDAccountStore> makeStore(const Parts& parts);
+
+// The client that a connection is at this moment.
+std::shared_ptr<const clients::Client> clientOfConnection(const Parts& parts, const std::string& uniqueName);
+
+// Tells the client of this ID apart from all others, those without an ID included.
+std::string clientKeyOfID(std::string_view id);
+
+}  // namespace bus

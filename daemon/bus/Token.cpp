@@ -1,0 +1,50 @@
+#include "daemon/bus/Token.h"
+
+#include <poll.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <string_view>
+#include <vector>
+
+namespace bus {
+namespace {
+
+constexpr int kLookUpEvery = 100;  // milliseconds
+
+// Wiped when it goes.
+struct Buffer {
+  std::vector<char> bytes = std::vector<char>(kLongestToken + 1);
+  Buffer() = default;
+  Buffer(const Buffer&) = delete;
+  Buffer& operator=(const Buffer&) = delete;
+  ~Buffer() { RVSecret::wipe(bytes.data(), bytes.size()); }
+};
+
+base::Failure invalid(const char* message) {
+  return {base::FailureKind::kInvalid, message};
+}
+
+}  // namespace
+
+base::Result<RVSecret> readToken(int descriptor, const std::function<bool()>& mayGoOn) {
+  Buffer buffer;
+  std::size_t size = 0;
+  for (;;) {
+    if (!mayGoOn()) return base::Failure{base::FailureKind::kFailed, "The token is not wanted any more"};
+    pollfd polled{descriptor, POLLIN, 0};
+    if (::poll(&polled, 1, kLookUpEvery) == 0) continue;
+    const ssize_t count = ::read(descriptor, buffer.bytes.data() + size, buffer.bytes.size() - size);
+    if (count < 0 && (errno == EINTR || errno == EAGAIN)) continue;
+    if (count < 0) return invalid("The token cannot be read");
+    if (count == 0) break;
+    size += static_cast<std::size_t>(count);
+    if (size > kLongestToken) return invalid("The token is too long");
+  }
+  std::string_view token(buffer.bytes.data(), size);
+  if (token.ends_with('\n')) token.remove_suffix(1);
+  if (token.empty()) return invalid("The token is empty");
+  return RVSecret(token);
+}
+
+}  // namespace bus
