@@ -39,14 +39,8 @@ void logLine(RVLogService& log,
              int level,
              std::string_view format,
              const std::vector<std::optional<RVValue>>& arguments,
-             const std::source_location& place) {
-  log.RVLog(level,
-            kRVLogFacilityDaemon,
-            place.file_name(),
-            place.function_name(),
-            static_cast<int>(place.line()),
-            format,
-            arguments);
+             const Place& place) {
+  log.RVLog(level, kRVLogFacilityDaemon, place.file, place.function, place.line, format, arguments);
 }
 
 }  // namespace
@@ -132,21 +126,21 @@ void Log::RVLog(int level,
 void error(RVLogService& log,
            std::string_view format,
            const std::vector<std::optional<RVValue>>& arguments,
-           const std::source_location& place) {
+           const Place& place) {
   logLine(log, kRVLogLevelError, format, arguments, place);
 }
 
 void notice(RVLogService& log,
             std::string_view format,
             const std::vector<std::optional<RVValue>>& arguments,
-            const std::source_location& place) {
+            const Place& place) {
   logLine(log, kRVLogLevelNotice, format, arguments, place);
 }
 
 void debug(RVLogService& log,
            std::string_view format,
            const std::vector<std::optional<RVValue>>& arguments,
-           const std::source_location& place) {
+           const Place& place) {
   logLine(log, kRVLogLevelDebug, format, arguments, place);
 }
 

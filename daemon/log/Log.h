@@ -3,7 +3,6 @@
 
 #include <memory>
 #include <optional>
-#include <source_location>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -85,18 +84,31 @@ class Log final : public RVLogService {
   LogSink& sink_;
 };
 
+// Where a line of the daemon's own comes from: as a default argument, the place of the call. (The standard
+// library's class of this kind is not there for every compiler that builds the daemon.)
+struct Place {
+  const char* file;
+  const char* function;
+  int line;
+  static Place ofCall(const char* file = __builtin_FILE(),
+                      const char* function = __builtin_FUNCTION(),
+                      int line = __builtin_LINE()) {
+    return {file, function, line};
+  }
+};
+
 // The daemon's own lines: facility "daemon", and the place of the call as their source.
 void error(RVLogService& log,
            std::string_view format,
            const std::vector<std::optional<RVValue>>& arguments = {},
-           const std::source_location& place = std::source_location::current());
+           const Place& place = Place::ofCall());
 void notice(RVLogService& log,
             std::string_view format,
             const std::vector<std::optional<RVValue>>& arguments = {},
-            const std::source_location& place = std::source_location::current());
+            const Place& place = Place::ofCall());
 void debug(RVLogService& log,
            std::string_view format,
            const std::vector<std::optional<RVValue>>& arguments = {},
-           const std::source_location& place = std::source_location::current());
+           const Place& place = Place::ofCall());
 
 }  // namespace logging
