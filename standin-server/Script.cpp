@@ -60,7 +60,7 @@ Script::Script(const std::string& text) {
       if (!entry.is_object()) throw std::runtime_error("it is not an object");
       ScriptedAnswer answer;
       for (const auto& [key, value] : entry.items()) setMember(answer, key, value);
-      if (answer.isEndless && answer.body.empty()) answer.body = "x";
+      if (answer.isEndless && answer.body.empty()) answer.body = std::string(4096, 'x');
       answers_.push_back(std::move(answer));
       ++number;
     }
