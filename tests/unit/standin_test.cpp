@@ -234,7 +234,6 @@ TEST_F(TheStandInServer, LogsWhatItWasAskedAndNoToken) {
 
 TEST_F(TheStandInServer, EndsWhileAnAnswerIsHeldBack) {
   timeout = std::chrono::seconds(1);
-  timeout = std::chrono::seconds(1);
   start(R"([{"delay_ms":3600000}])");
   PendingOutcome pending;
   requests->initWithPermissions({"odd"}, std::nullopt)->performRequestWithHandler(pending.handler());
