@@ -23,6 +23,10 @@ FakeHost::FakeHost()
   keychain.setMasterToken("account-1", "master-token");
 }
 
+FakeHost::~FakeHost() {
+  journal->setBeforeCall(nullptr);
+}
+
 RVDHostServices FakeHost::services() {
   RVDHostServices services;
   services.keychainManager = &keychain;

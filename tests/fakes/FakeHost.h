@@ -21,6 +21,8 @@ namespace fakes {
 class FakeHost {
  public:
   FakeHost();
+  // Takes the journal's hook away: a queue that outlives the host still writes its calls down.
+  ~FakeHost();
 
   RVDHostServices services();
 

@@ -12,6 +12,7 @@
 // Each function calls the operation of the same name, without its underscore.
 struct TKFacebookAccountAccessPluginTestAccess {
   using PromptCompletion = TKFacebookAccountAccessPlugin::PromptCompletion;
+  using ServerCompletion = TKFacebookAccountAccessPlugin::ServerCompletion;
 
   const TKFacebookAccountAccessPlugin& plugin;
 
@@ -86,5 +87,61 @@ struct TKFacebookAccountAccessPluginTestAccess {
       const std::function<void(ZQUserNotificationRef, ZQResponseFlags)>& completionBlock) const {
     plugin._showUserNotificationWithTitle(
         title, message, defaultButtonTitle, alternateButtonTitle, completionBlock);
+  }
+
+  std::shared_ptr<RVAccount> accountOfType(const std::shared_ptr<const RVAccountType>& type,
+                                           RVDAccountStore& store) const {
+    return plugin._accountOfType(type, store);
+  }
+  bool shouldIgnoreAccessRequest() const { return plugin._shouldIgnoreAccessRequest(); }
+  bool validateOptionsDictionary(const RVDictionary& options) const {
+    return plugin._validateOptionsDictionary(options);
+  }
+  std::optional<std::string> appIDFromOptionsDictionary(const RVDictionary& options) const {
+    return plugin._appIDFromOptionsDictionary(options);
+  }
+  RVPermissionSet permissionsFromOptionsDictionary(const RVDictionary& options) const {
+    return plugin._permissionsFromOptionsDictionary(options);
+  }
+  std::optional<std::string> audienceFromOptionsDictionary(const RVDictionary& options) const {
+    return plugin._audienceFromOptionsDictionary(options);
+  }
+  RVDictionary persistentDictionaryForOptions(const RVDictionary& options) const {
+    return plugin._persistentDictionaryForOptions(options);
+  }
+  const RVPermissionSet* allPermissionsInCategory(const std::optional<std::string_view>& category) const {
+    return plugin._allPermissionsInCategory(category);
+  }
+  RVPermissionSet allReadPermissions() const { return plugin._allReadPermissions(); }
+  RVPermissionSet userProfileReadPermissions() const { return plugin._userProfileReadPermissions(); }
+  void getServerAuthorizationForClient(const std::shared_ptr<const RVDClient>& client,
+                                       const std::string& appID,
+                                       const std::optional<RVPermissionSet>& permissions,
+                                       const std::optional<std::string>& audience,
+                                       const std::shared_ptr<RVAccount>& account,
+                                       const ServerCompletion& completion) const {
+    plugin._getServerAuthorizationForClient(client, appID, permissions, audience, account, completion);
+  }
+  std::optional<std::string> serverAudienceStringForAudience(
+      const std::optional<std::string>& audience) const {
+    return plugin._serverAudienceStringForAudience(audience);
+  }
+  void saveCredentialForClient(const RVDClient& client,
+                               RVAccount& account,
+                               const std::optional<RVSecret>& accessToken) const {
+    plugin._saveCredentialForClient(client, account, accessToken);
+  }
+  std::string csvStringFromSet(const RVPermissionSet& set) const { return plugin._csvStringFromSet(set); }
+
+  const RVPermissionSet& permissionCategories() const { return plugin.permissionCategories_; }
+  bool basicReadPermissionsAreFilled() const { return plugin.basicReadPermissions_.names != nullptr; }
+  bool extendedReadPermissionsAreFilled() const { return plugin.extendedReadPermissions_.names != nullptr; }
+  bool writePermissionsAreFilled() const { return plugin.writePermissions_.names != nullptr; }
+  bool managePermissionsAreFilled() const { return plugin.managePermissions_.names != nullptr; }
+
+  // Puts the process back to where no plug-in object has read a preference yet. Not while one is at work.
+  static void forgetPreferencesQueue() {
+    TKFacebookAccountAccessPlugin::preferencesState() =
+        std::make_unique<TKFacebookAccountAccessPlugin::PreferencesState>();
   }
 };
