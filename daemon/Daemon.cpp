@@ -5,6 +5,7 @@
 
 #include <algorithm>
 #include <exception>
+#include <stdexcept>
 #include <utility>
 
 #include "daemon/alerts/AlertService.h"
@@ -258,7 +259,12 @@ void Daemon::serve(const Places& places) {
         if (newOwner.empty() && name.starts_with(':')) connectionLeft(name);
       },
       sdbus::floating_slot);
-  bus_->connection->requestName(bus::kServiceName);
+  try {
+    bus_->connection->requestName(bus::kServiceName);
+  } catch (const sdbus::Error& error) {
+    throw std::runtime_error(std::string("the name ") + bus::kServiceName +
+                             " was not to be had: " + error.getMessage());
+  }
 }
 
 void Daemon::connectionLeft(const std::string& uniqueName) {

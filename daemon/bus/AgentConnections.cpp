@@ -77,8 +77,11 @@ void AgentConnections::showAlert(const alerts::AgentAddress& agent,
   constexpr auto kNoTimeout = std::numeric_limits<std::uint64_t>::max();
   proxy->callMethod(
       call,
-      [answered = std::move(answered)](sdbus::MethodReply& reply, const sdbus::Error* error) {
-        answered(error == nullptr ? responseFlags(reply) : std::nullopt);
+      [answered = std::move(answered), name = agent.name](sdbus::MethodReply& reply,
+                                                          const sdbus::Error* error) {
+        // The bus delivers the reply of anybody who guesses the call's number; the agent's own counts.
+        const bool isAnswer = error == nullptr && reply.getSender() == name;
+        answered(isAnswer ? responseFlags(reply) : std::nullopt);
       },
       kNoTimeout);
   loop_.sendRest();

@@ -3,6 +3,7 @@
 #include <poll.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <string_view>
 #include <vector>
@@ -44,6 +45,10 @@ base::Result<RVSecret> readToken(int descriptor, const std::function<bool()>& ma
   std::string_view token(buffer.bytes.data(), size);
   if (token.ends_with('\n')) token.remove_suffix(1);
   if (token.empty()) return invalid("The token is empty");
+  // It is to travel in a header of HTTP, which can carry none of these.
+  const auto isControl = [](unsigned char byte) { return byte < 0x20 || byte == 0x7F; };
+  if (std::any_of(token.begin(), token.end(), isControl))
+    return invalid("The token holds control characters");
   return RVSecret(token);
 }
 

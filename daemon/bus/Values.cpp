@@ -221,14 +221,12 @@ class ValueReader {
   RVValue dictionary(int level) {
     enter(level);
     const std::string contents = contents_;
-    const char keyType = contents[1];
-    if (keyType != 's' && keyType != 'o' && keyType != 'g')
-      throw sdbus::Error(kInvalidArgs, "The keys of a dictionary must be strings");
+    if (contents[1] != 's') throw sdbus::Error(kInvalidArgs, "The keys of a dictionary must be strings");
     message_.enterContainer(contents);
     RVDictionary entries;
     while (!isAtEnd()) {
       message_.enterDictEntry(std::string(contents_));
-      std::string key = text(keyType);
+      std::string key = text('s');
       entries.try_emplace(std::move(key), read(level + 1));
       leave('e');
     }
