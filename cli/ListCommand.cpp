@@ -1,0 +1,48 @@
+// rvctl list
+#include <nlohmann/json.hpp>
+
+#include "cli/Commands.h"
+
+namespace cli {
+namespace {
+
+// "a, b"; "-" where there is none.
+std::string joined(const Json& texts) {
+  std::string line;
+  for (const Json& text : texts) line += (line.empty() ? "" : ", ") + valueText(text);
+  return line.empty() ? "-" : line;
+}
+
+std::string optionsText(const Json& options) {
+  std::string line;
+  for (const auto& [key, value] : options.items())
+    line += (line.empty() ? "" : ", ") + key + "=" + valueText(value);
+  return line.empty() ? "-" : line;
+}
+
+}  // namespace
+
+ExitStatus listAuthorizations(Session& session) {
+  const auto authorizations = session.service.authorizations();
+  if (!authorizations) return session.output.failed(authorizations.failure());
+  if (session.output.wantsJSON()) {
+    session.output.print(Json::object({{"authorizations", *authorizations}}));
+    return ExitStatus::kDone;
+  }
+  if (authorizations->empty()) {
+    session.output.print(std::string("No application has been granted or refused access.\n"));
+    return ExitStatus::kDone;
+  }
+  std::vector<std::vector<std::string>> rows;
+  for (const Json& record : *authorizations)
+    rows.push_back({record.value("client_id", ""),
+                    record.value("name", ""),
+                    record.value("granted", false) ? "granted" : "refused",
+                    joined(record.value("permissions", Json::array())),
+                    optionsText(record.value("options", Json::object())),
+                    timeText(record.value("changed", 0LL))});
+  session.output.print(tableOf({"CLIENT", "NAME", "ACCESS", "PERMISSIONS", "OPTIONS", "CHANGED"}, rows));
+  return ExitStatus::kDone;
+}
+
+}  // namespace cli
