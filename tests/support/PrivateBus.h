@@ -1,0 +1,41 @@
+// A message bus of a test's own.
+#pragma once
+
+#include <spawn.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <csignal>
+#include <stdexcept>
+#include <string>
+
+// Runs a session bus that nobody else knows of; it ends with the object.
+class PrivateBus {
+ public:
+  PrivateBus() {
+    int ends[2];
+    if (::pipe(ends) != 0) throw std::runtime_error("no pipe for the bus's address");
+    std::string program = "dbus-daemon";
+    std::string configuration = "--session";
+    std::string stay = "--nofork";
+    std::string print = "--print-address=" + std::to_string(ends[1]);
+    char* const arguments[] = {program.data(), configuration.data(), stay.data(), print.data(), nullptr};
+    const int error = ::posix_spawnp(&process_, "dbus-daemon", nullptr, nullptr, arguments, environ);
+    ::close(ends[1]);
+    for (char byte = 0; error == 0 && ::read(ends[0], &byte, 1) == 1 && byte != '\n';) address_ += byte;
+    ::close(ends[0]);
+    if (address_.empty()) throw std::runtime_error("the bus did not start");
+  }
+  PrivateBus(const PrivateBus&) = delete;
+  PrivateBus& operator=(const PrivateBus&) = delete;
+  ~PrivateBus() {
+    ::kill(process_, SIGTERM);
+    ::waitpid(process_, nullptr, 0);
+  }
+
+  const std::string& address() const { return address_; }
+
+ private:
+  pid_t process_ = 0;
+  std::string address_;
+};
