@@ -73,7 +73,7 @@ TEST_F(TheInstalledApplications, AreTheUsersOwnBeforeTheSystems) {
 
 TEST_F(TheInstalledApplications, DoNotCountAHiddenEntryEvenWhereALaterDirectoryHasIt) {
   install("app.desktop", entry("App"));
-  installAtHome("app.desktop", "[Desktop Entry]\nHidden=true\n");
+  installAtHome("app.desktop", entry("App", "Hidden=true\n"));
   EXPECT_FALSE(find("app"));
 }
 
@@ -127,6 +127,7 @@ TEST_F(TheInstalledApplications, HaveNoIDThatCouldPassForAnother) {
 TEST_F(TheInstalledApplications, AreLookedForInLinkedDirectoriesWithoutGoingRoundForEver) {
   std::filesystem::create_directories(directory_.path("system/applications"));
   std::filesystem::create_directory_symlink(".", directory_.path("system/applications/a"));
+  std::filesystem::create_directory_symlink(".", directory_.path("system/applications/a-a"));
   std::string id;
   for (int i = 0; i < 120; ++i) id += "a-";
   EXPECT_FALSE(find(id + "b"));

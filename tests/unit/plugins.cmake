@@ -16,7 +16,9 @@ endfunction()
 rvd_test(plugins_tests
   SOURCES unit/plugins_catalogue_test.cpp unit/plugins_module_test.cpp unit/plugins_string_table_test.cpp
   LIBRARIES rvd_plugins rvd_fakes)
-target_compile_definitions(plugins_tests PRIVATE TEST_MODULES="${testModules}")
+target_compile_definitions(plugins_tests PRIVATE
+  TEST_MODULES="${testModules}" BUILT_PLUGINS="${CMAKE_BINARY_DIR}/plugins")
+add_dependencies(plugins_tests facebook_plugin)
 
 rvd_test_module(Working "kRVDAccountAccessPluginABIVersion, \"WorkingPlugin\", supports, initWorking")
 rvd_test_module(OtherVersion "99, \"OtherPlugin\", abortingSupports, abortingInit")

@@ -1,6 +1,8 @@
 #include <gtest/gtest.h>
 
 #include "daemon/plugins/PluginModule.h"
+#include "daemon/plugins/StringTable.h"
+#include "tests/fakes/FakeHost.h"
 #include "tests/fakes/FakeTexts.h"
 #include "tests/support/MessageCatalogues.h"
 #include "tests/support/TemporaryDirectory.h"
@@ -80,6 +82,19 @@ TEST_F(APluginDirectory, ThatIsNotThereHasNoPlugins) {
   EXPECT_TRUE(log_.lines().empty());
   EXPECT_TRUE(loadPlugins(directory.path("none"), services_, {}).empty());
   EXPECT_EQ(log_.lines().size(), 1u);
+}
+
+TEST(TheFacebookBundle, IsLoadedWithItsPluginAndItsWords) {
+  fakes::FakeHost host;
+  const auto modules = loadPlugins(BUILT_PLUGINS, host.services(), {});
+  ASSERT_EQ(modules.size(), 1u);
+  EXPECT_EQ(modules[0]->className(), "TKFacebookAccountAccessPlugin");
+  EXPECT_TRUE(modules[0]->supportsAccountType(std::string(RVAccountTypeIdentifierFacebook)));
+  fakes::FakeLog log;
+  plugins::StringTable table(BUILT_PLUGINS "/TKFacebookAccountAccessPlugin/resources", {}, log);
+  EXPECT_NE(table.localizedStringForKey("ACCOUNT_ACCESS_UNKNOWN_ADDITIONAL_FORMAT", "", "Localizable"),
+            "ACCOUNT_ACCESS_UNKNOWN_ADDITIONAL_FORMAT");
+  EXPECT_TRUE(log.lines().empty());
 }
 
 }  // namespace
