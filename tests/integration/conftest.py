@@ -1,7 +1,6 @@
 """Fixtures of the integration tests. They run in a sandbox of their own and refuse to run without one: every
 program that a test starts sees a HOME, a runtime folder and a message bus that were made for this test."""
 
-import glob
 import os
 import sys
 import threading
@@ -26,16 +25,16 @@ class Programs:
 
     def __init__(self, build_dir):
         self.build_dir = os.path.abspath(build_dir)
-        self.rvd = self._find("daemon/rvd")
-        self.rvctl = self._find("cli/rvctl")
-        self.standin = self._find("standin-server/rvd-standin")
-        self.plugin_dir = os.path.dirname(self._find("plugins/TKFacebookAccountAccessPlugin"))
+        self.rvd = self._built("daemon/rvd")
+        self.rvctl = self._built("cli/rvctl")
+        self.standin = self._built("standin-server/rvd-standin")
+        self.plugin_dir = self._built("plugins")
 
-    def _find(self, pattern):
-        found = glob.glob(os.path.join(self.build_dir, pattern))
-        if not found:
-            pytest.exit(f"nothing was built at {pattern} in {self.build_dir}", 2)
-        return found[0]
+    def _built(self, name):
+        path = os.path.join(self.build_dir, name)
+        if not os.path.exists(path):
+            pytest.exit(f"{path} has not been built", 2)
+        return path
 
 
 def pytest_configure(config):

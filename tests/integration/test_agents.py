@@ -3,10 +3,10 @@
 import signal
 
 import pytest
-from gi.repository import GLib
+from gi.repository import Gio, GLib
 
 from harness.agent import ALLOW, CLOSED, REFUSE
-from harness.bus import AGENT_MANAGER
+from harness.bus import AGENT_MANAGER, NAME
 from harness.expect import GRANTED, INVALID_ARGS, NO_ACCESS, USER_REFUSED, bus_error
 
 
@@ -285,23 +285,32 @@ def test_a_request_stands_unanswered_while_the_daemon_knows_of_no_agent_and_its_
     assert agent.asked() == 0
 
 
-def test_an_alert_cannot_be_answered_for_another_agent(asking):
+@pytest.mark.parametrize("unique", [True, False], ids=["by its unique name", "by its name"])
+def test_nobody_can_answer_in_place_of_the_agent(asking, unique):
     agent = asking.agent()
     pending = asking.application().start_request(["email"])
     alert = agent.next()
-    assert len(alert.id) >= 16
     intruder = asking.bus.connect()
-    message_serial = alert._invocation.get_message().get_serial()
-    from gi.repository import Gio
-
-    reply = Gio.DBusMessage.new()
-    reply.set_message_type(Gio.DBusMessageType.METHOD_RETURN)
-    reply.set_reply_serial(message_serial)
-    reply.set_destination("com.zentor.rvd")
-    reply.set_body(GLib.Variant("(t)", (0,)))
-    intruder.gio.send_message(reply, Gio.DBusSendMessageFlags.NONE)
+    # The bus delivers a reply of whomever; its number is easily guessed.
+    forged = Gio.DBusMessage.new()
+    forged.set_message_type(Gio.DBusMessageType.METHOD_RETURN)
+    forged.set_reply_serial(alert.serial)
+    owner = intruder.driver("GetNameOwner", GLib.Variant("(s)", (NAME,)))
+    forged.set_destination(owner if unique else NAME)
+    forged.set_body(GLib.Variant("(t)", (ALLOW,)))
+    intruder.gio.send_message(forged, Gio.DBusSendMessageFlags.NONE)
     intruder.settle()
-    assert not pending.answered
+    if unique:  # it has spoiled the call, so that the user is asked anew
+        alert.wait_until_dismissed()
+        alert = agent.next()
     alert.refuse()
     assert pending.answer() == USER_REFUSED
 
+
+def test_alerts_have_names_that_nobody_can_guess(asking):
+    agent = asking.agent(answer=REFUSE)
+    for number in range(4):
+        asking.application(f"org.example.App{number}").request(["email"])
+    names = [alert.id for alert in agent.shown]
+    assert len(set(names)) == 4
+    assert all(len(name) >= 32 for name in names), names

@@ -126,6 +126,7 @@ def test_an_audience_of_any_type_is_kept_as_it_is_where_none_is_needed(asking, k
 CANNOT_BE_HANDED_ON = {
     "keys that are numbers": GLib.Variant("a{iv}", {1: GLib.Variant("s", "a")}),
     "keys that are paths": GLib.Variant("a{os}", {"/a": "a"}),
+    "keys that are booleans": GLib.Variant("a{bs}", {True: "a"}),
     "a number beyond 64 bits with sign": GLib.Variant("t", 2**63),
     "such a number deep inside": GLib.Variant("av", [GLib.Variant("at", [2**64 - 1])]),
     "17 levels": nested(17),
@@ -209,12 +210,14 @@ def test_strange_text_is_text(asking, value):
     assert application.access()[2] == {"app_id": value, "audience": value}
 
 
-def test_a_name_with_control_characters_reaches_the_agent_as_plain_text(asking):
+def test_an_applications_name_is_plain_text_in_the_alert(asking):
     asking.allowing.answer = REFUSE
     name = "<b>Bank</b> %@ \u202e"
     application = asking.application(name=name)
     application.request(["email"])
-    assert name in asking.allowing.shown[0].message
+    (alert,) = asking.allowing.shown
+    assert "<b>Bank</b> %@" in alert.message
+    assert "\u202e" not in alert.message, "what turns the text around is no part of a name"
 
 
 WRONG_CALLS = [

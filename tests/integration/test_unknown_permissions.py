@@ -13,12 +13,13 @@ def asking(wired_world, wire):
 
 
 def test_the_servers_description_stands_behind_the_sentence(asking, wire):
-    wire.on("/describe", answer('"It will also see your shoe size."'))
+    wire.on("/describe", answer('"see your shoe size"'))
     agent = asking.agent()
     pending = asking.application(name="Photo App").start_request(["email", "shoe_size", "hat_size"])
     alert = agent.next()
-    assert alert.message.endswith("It will also see your shoe size.")
-    assert alert.message.startswith("“Photo App”") or "Photo App" in alert.message
+    sentence, description = alert.message.split(". ", 1)
+    assert "Photo App" in sentence
+    assert "see your shoe size" in description
     alert.allow()
     assert pending.answer() == GRANTED
 

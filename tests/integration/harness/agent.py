@@ -39,6 +39,10 @@ class Alert:
     def message(self):
         return self.description["message"]
 
+    @property
+    def serial(self):
+        return self._invocation.get_message().get_serial()
+
     def answer(self, flags):
         """Answers, unless that has been done."""
         if self._answered.acquire(blocking=False):

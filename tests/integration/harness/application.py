@@ -43,7 +43,7 @@ class Application:
         self.app_id = app_id
 
     def register(self, app_id=None):
-        self.connection.call(ACCOUNTS, "Register", GLib.Variant("(s)", (app_id or self.app_id,)))
+        self.connection.call(ACCOUNTS, "Register", GLib.Variant("(s)", (self.app_id if app_id is None else app_id,)))
 
     def start_request(self, permissions=None, interact=True, account_type=FACEBOOK, **others):
         return self.start_request_with(options(permissions=permissions, **others), interact, account_type)

@@ -123,7 +123,9 @@ class Connection:
                 text = re.sub(r"^GDBus\.Error:[^ ]*: ", "", error.message)
                 future.set_exception(BusError(name, text))
 
-        handles = Gio.UnixFDList.new_from_array(list(fds)) if fds else None
+        handles = Gio.UnixFDList.new() if fds else None
+        for descriptor in fds:
+            handles.append(descriptor)  # a copy: the caller keeps its own
         self.gio.call_with_unix_fd_list(
             destination, path, interface, method, parameters, None,
             Gio.DBusCallFlags.NONE, NO_TIMEOUT, handles, None, finish,

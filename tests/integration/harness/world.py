@@ -1,5 +1,6 @@
 """One test's world: everything that it starts lives in a folder of its own and ends with it."""
 
+import contextlib
 import os
 import shutil
 import signal
@@ -163,18 +164,18 @@ class World:
         )
 
     def dispose(self):
-        """Ends everything. rvd is stopped in order where the test has left it running."""
-        try:
-            if self.daemon is not None and self.daemon.running:
-                self.stop_daemon()
-            for daemon in self.daemons:
-                daemon.assert_no_sanitizer_report()
-        finally:
-            for process in reversed(self._processes):
-                process.dispose()
-            for disposable in reversed(self._disposables):
-                disposable.dispose()
+        """Ends everything, in order where it still runs, and says what did not go well."""
+        with contextlib.ExitStack() as last_to_first:
+            last_to_first.callback(shutil.rmtree, self.root)
+            if self.trusted.startswith("/run/"):
+                last_to_first.callback(shutil.rmtree, self.trusted)
             if self.bus is not None:
-                self.bus.dispose()
-            shutil.rmtree(self.root)
-            shutil.rmtree(self.trusted, ignore_errors=True)
+                last_to_first.callback(self.bus.dispose)
+            for process in self._processes:
+                last_to_first.callback(process.dispose)
+            for disposable in self._disposables:
+                last_to_first.callback(disposable.dispose)
+            for daemon in self.daemons:
+                last_to_first.callback(daemon.assert_no_sanitizer_report)
+            if self.daemon is not None and self.daemon.running:
+                last_to_first.callback(self.stop_daemon)
