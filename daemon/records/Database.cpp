@@ -37,7 +37,7 @@ base::Result<void> makeEmpty(const state::Directory& directory) {
     if (!connection) return connection.failure();
     if (auto migrated = migrate(*connection, 0); !migrated) return migrated;
   }
-  // The journal of a database that is gone must not be rolled back into this one.
+  // The journal of a database that is gone or set aside must not be rolled back into this one.
   if (auto removed = directory.removeFile(std::string(kFileName) + kJournalSuffix); !removed) return removed;
   return directory.rename(kUnfinishedName, kFileName);
 }
@@ -62,11 +62,6 @@ base::Result<Connection> openSound(const state::Directory& directory) {
 base::Result<void> setAside(const state::Directory& directory, const std::string& reason, RVLogService& log) {
   const auto aside = directory.setAside(kFileName);
   if (!aside) return aside.failure();
-  // What the journal holds belongs to the damaged file. Where there is none there is nothing to keep.
-  const std::string journal = std::string(kFileName) + kJournalSuffix;
-  if (const auto exists = directory.checkFile(journal); exists && *exists) {
-    if (auto renamed = directory.rename(journal, *aside + kJournalSuffix); !renamed) return renamed;
-  }
   logging::error(log,
                  "%@ is damaged (%@). It was set aside as %@ and an empty one begun: accounts have to be "
                  "added again, and every client will ask again.",

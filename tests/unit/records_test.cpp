@@ -1,0 +1,329 @@
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <sys/resource.h>
+
+#include <csignal>
+#include <filesystem>
+#include <future>
+#include <set>
+#include <thread>
+
+#include "tests/support/StoredState.h"
+
+namespace {
+
+using support::succeed;
+using support::valueOf;
+using ::testing::Contains;
+using ::testing::ElementsAre;
+using ::testing::HasSubstr;
+using ::testing::IsEmpty;
+
+const std::string kType(RVAccountTypeIdentifierFacebook);
+
+class StoredRecords : public ::testing::Test {
+ protected:
+  void reopen() {
+    state_.reset();
+    open();
+  }
+  void open() { state_ = std::make_unique<support::StoredState>(path_); }
+  void SetUp() override { open(); }
+
+  std::vector<std::string> clients(bool onlyGranted = false) {
+    std::vector<std::string> ids;
+    for (const auto& record : state_->records->list(kType))
+      if (record.granted || !onlyGranted) ids.push_back(record.clientId);
+    return ids;
+  }
+  // Whether these bytes stand anywhere in the state directory.
+  bool isOnDisk(const std::string& bytes) {
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(path_))
+      if (entry.is_regular_file() && support::contentOf(entry.path()).find(bytes) != std::string::npos)
+        return true;
+    return false;
+  }
+
+  support::TemporaryDirectory temporary_;
+  const std::string path_ = temporary_.path("rvd");
+  std::unique_ptr<support::StoredState> state_;
+};
+
+TEST_F(StoredRecords, SurviveReopening) {
+  using std::string_literals::operator""s;
+  const records::AuthorizationRecord written{
+      kType,
+      "app\0\xff"s,
+      true,
+      RVPermissionSet{"email", "\xfe"s, ""},
+      RVDictionary{{"app_id", "1\0\xff"s}, {"\xed\xa0\x80", RVArray{1, 1.0, true, RVValue()}}},
+      {}};
+  succeed(state_->records->put(written));
+  state_->put("refused", false);
+  const auto before = state_->records->list(kType);
+  reopen();
+  EXPECT_TRUE(state_->records->list(kType) == before);
+  const auto read = state_->records->find(kType, "app\0\xff"s);
+  ASSERT_TRUE(read);
+  EXPECT_EQ(read->changed, support::StoredState::clock());
+  EXPECT_TRUE(read->permissions == written.permissions);
+  EXPECT_TRUE(read->options == written.options);
+  EXPECT_TRUE(state_->log.lines().empty());
+}
+
+TEST_F(StoredRecords, AreReadWithoutTheDatabase) {
+  state_->put("app", true);
+  // The database is in use until the read is done.
+  succeed(state_->database->read([&](records::Connection&) -> base::Result<void> {
+    auto read = std::async(std::launch::async, [&] {
+      return state_->records->find(kType, "app").has_value() && state_->records->list(kType).size() == 1 &&
+             state_->storeFor(nullptr)->accountsWithAccountTypeIdentifier(kType).empty();
+    });
+    EXPECT_EQ(read.wait_for(std::chrono::seconds(60)), std::future_status::ready);
+    EXPECT_TRUE(read.get());
+    return {};
+  }));
+}
+
+TEST_F(StoredRecords, TellWhoListensAfterEachWriteThatWorked) {
+  std::vector<std::string> heard;
+  state_->records->onChange([&](const std::string& type) {
+    heard.push_back(type + " " + std::to_string(state_->records->list(type).size()));
+  });
+  state_->put("app", false);
+  succeed(state_->records->forgetRefusal(kType, "app"));
+  EXPECT_FALSE(state_->records->forgetRefusal(kType, "app"));
+  succeed(state_->records->removeAll("other"));
+  EXPECT_THAT(heard, ElementsAre(kType + " 1", kType + " 0", "other 0"));
+}
+
+TEST_F(StoredRecords, LetARefusalBeForgottenAndAGrantNot) {
+  state_->put("refused", false);
+  state_->put("granted", true);
+  succeed(state_->records->forgetRefusal(kType, "refused"));
+  EXPECT_EQ(state_->records->forgetRefusal(kType, "granted").failure().kind, base::FailureKind::kRefused);
+  EXPECT_EQ(state_->records->forgetRefusal(kType, "nobody").failure().kind, base::FailureKind::kNotFound);
+  EXPECT_EQ(state_->records->forgetRefusal("other", "granted").failure().kind, base::FailureKind::kNotFound);
+  EXPECT_THAT(clients(), ElementsAre("granted"));
+  reopen();
+  EXPECT_THAT(clients(), ElementsAre("granted"));
+}
+
+TEST_F(StoredRecords, StandUnchangedWhereTheDiskIsFull) {
+  const std::string account = state_->addAccount();
+  state_->put("app", true);
+  ASSERT_FALSE(state_->storeCredential("app", "kept"));
+  struct rlimit before {};
+  ASSERT_EQ(::getrlimit(RLIMIT_FSIZE, &before), 0);
+  const auto handler = std::signal(SIGXFSZ, SIG_IGN);
+  const struct rlimit full = {0, before.rlim_max};
+  ASSERT_EQ(::setrlimit(RLIMIT_FSIZE, &full), 0);
+  const auto put = state_->records->put({kType, "app", false, {}, {}, {}});
+  const auto removed = state_->records->removeAll(kType);
+  const auto added = state_->accounts->add(kType, "another");
+  const auto credential = state_->storeCredential("app", "new");
+  ASSERT_EQ(::setrlimit(RLIMIT_FSIZE, &before), 0);
+  std::signal(SIGXFSZ, handler);
+  EXPECT_FALSE(put);
+  EXPECT_FALSE(removed);
+  EXPECT_FALSE(added);
+  EXPECT_TRUE(credential);
+  for (int round = 0; round < 2; ++round) {
+    EXPECT_THAT(clients(true), ElementsAre("app"));
+    EXPECT_EQ(state_->accounts->list().size(), 1U);
+    EXPECT_EQ(state_->keychain->credentialForClient(account, "app")->oauthToken().reveal(), "kept");
+    reopen();
+  }
+  state_->put("app", false);
+  EXPECT_THAT(clients(true), IsEmpty());
+}
+
+TEST_F(StoredRecords, AreGoneFromTheDiskWhenTheyWereRemoved) {
+  const std::string account = state_->addAccount("a-master-token");
+  state_->put("org.example.Unmistakable", true);
+  ASSERT_TRUE(isOnDisk("org.example.Unmistakable"));
+  EXPECT_FALSE(isOnDisk("a-master-token"));
+  succeed(state_->records->removeAll(kType));
+  EXPECT_FALSE(isOnDisk("org.example.Unmistakable"));
+  ASSERT_TRUE(isOnDisk(account));
+  succeed(state_->accounts->remove(account));
+  EXPECT_FALSE(isOnDisk(account));
+}
+
+TEST_F(StoredRecords, CanBeWrittenAndReadFromManyThreads) {
+  state_->addAccount();
+  std::vector<std::thread> threads;
+  for (int t = 0; t < 4; ++t) {
+    threads.emplace_back([&, t] {
+      const std::string id = "app" + std::to_string(t);
+      for (int i = 0; i < 10; ++i) {
+        state_->put(id, i % 2 == 1);
+        EXPECT_EQ(state_->records->find(kType, id)->granted, i % 2 == 1);
+        EXPECT_FALSE(state_->storeCredential(id, std::to_string(i)));
+        state_->accessLog.RVDLogAccessRequest(kType, id, true, true, 0);
+        EXPECT_LE(state_->records->list(kType).size(), 4U);
+        EXPECT_TRUE(state_->accessLog.newest(5));
+        if (i % 2 == 1) {
+          const auto credential =
+              state_->keychain->credentialForClient(state_->accounts->list().at(0).identifier, id);
+          EXPECT_EQ(credential->oauthToken().reveal(), std::to_string(i));
+        }
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(clients(true).size(), 4U);
+  EXPECT_EQ(valueOf(state_->accessLog.newest(1000)).size(), 40U);
+  reopen();
+  EXPECT_EQ(clients(true).size(), 4U);
+}
+
+class StoredAccounts : public StoredRecords {};
+
+TEST_F(StoredAccounts, KeepTheirOrderAndTheirNames) {
+  using std::string_literals::operator""s;
+  std::vector<std::string> added;
+  std::set<std::string> unique;
+  for (const std::string& username : {"zoe"s, "adam"s, "zoe"s, ""s, "\xff\0"s}) {
+    added.push_back(username);
+    unique.insert(valueOf(state_->accounts->add(kType, username)).identifier);
+  }
+  EXPECT_EQ(unique.size(), added.size());
+  succeed(state_->accounts->remove(state_->accounts->list().at(1).identifier));
+  added.erase(added.begin() + 1);
+  added.push_back("last");
+  valueOf(state_->accounts->add("other", "last"));
+  for (int round = 0; round < 2; ++round) {
+    std::vector<std::string> listed;
+    for (const auto& account : state_->accounts->list()) {
+      listed.push_back(account.username);
+      EXPECT_EQ(state_->accounts->find(account.identifier)->username, account.username);
+    }
+    EXPECT_EQ(listed, added);
+    EXPECT_EQ(state_->accounts->listOfType(kType).size(), 4U);
+    reopen();
+  }
+}
+
+TEST_F(StoredAccounts, TakeTheirCredentialsWithThemWhenTheyGo) {
+  const std::string first = state_->addAccount("first master");
+  ASSERT_FALSE(state_->storeCredential("app", "token"));
+  const std::string second = state_->addAccount("second master");
+  const auto carrier = state_->account();
+  succeed(state_->accounts->remove(first));
+  EXPECT_EQ(state_->keychain->credentialForAccount(*carrier, "app"), nullptr);
+  EXPECT_EQ(state_->keychain->credentialForAccount(*carrier, std::nullopt), nullptr);
+  EXPECT_EQ(state_->accounts->remove(first).failure().kind, base::FailureKind::kNotFound);
+  EXPECT_FALSE(state_->accounts->find(first));
+  EXPECT_NE(state_->keychain->credentialForAccount(*state_->account(), std::nullopt), nullptr);
+  EXPECT_EQ(state_->accounts->list().at(0).identifier, second);
+}
+
+class TheStoredAccessLog : public StoredRecords {};
+
+TEST_F(TheStoredAccessLog, ShowsTheNewestFirstUpToTheLimit) {
+  EXPECT_TRUE(valueOf(state_->accessLog.newest(10)).empty());
+  for (int i = 0; i < 5; ++i)
+    state_->accessLog.RVDLogAccessRequest(kType, std::to_string(i), i % 2 == 0, true, 0);
+  reopen();
+  EXPECT_TRUE(valueOf(state_->accessLog.newest(0)).empty());
+  const auto entries = valueOf(state_->accessLog.newest(3));
+  ASSERT_EQ(entries.size(), 3U);
+  EXPECT_EQ(entries[0].clientId, "4");
+  EXPECT_TRUE(entries[0].granted);
+  EXPECT_EQ(entries[2].clientId, "2");
+  EXPECT_EQ(entries[0].time, support::StoredState::clock());
+  EXPECT_EQ(valueOf(state_->accessLog.newest(0xffffffff)).size(), 5U);
+}
+
+TEST_F(TheStoredAccessLog, KeepsNoMoreThanItsLimit) {
+  succeed(state_->database->write([](records::Connection& connection) {
+    return connection.run(
+        "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < ?1) "
+        "INSERT INTO access_log SELECT i, 0, 't', NULL, 0, 0 FROM n",
+        records::kAccessLogEntries);
+  }));
+  for (int i = 0; i < 3; ++i) state_->accessLog.RVDLogAccessRequest(kType, "new", true, true, 0);
+  const auto entries = valueOf(state_->accessLog.newest(0xffffffff));
+  EXPECT_EQ(entries.size(), static_cast<std::size_t>(records::kAccessLogEntries));
+  EXPECT_EQ(entries[2].clientId, "new");
+  EXPECT_EQ(entries[3].clientId, std::nullopt);
+}
+
+class InterruptedWork : public StoredRecords {
+ protected:
+  void SetUp() override {
+    StoredRecords::SetUp();
+    account_ = state_->addAccount();
+    for (const char* id : {"one", "two"}) {
+      state_->put(id, true);
+      ASSERT_FALSE(state_->storeCredential(id, id));
+    }
+  }
+  // What the next start does.
+  void restart() {
+    reopen();
+    succeed(state_->intents.completeInterrupted(*state_->records, *state_->accounts, state_->log));
+    succeed(state_->keychain->reconcile());
+  }
+  bool holdsCredential(const std::string& id) {
+    return state_->keychain->credentialForAccount(*state_->account(), id) != nullptr;
+  }
+
+  std::string account_;
+};
+
+TEST_F(InterruptedWork, ThatWasFinishedIsNotDoneAgain) {
+  const auto number = valueOf(state_->intents.begin({records::Intent::Kind::kRevokeClient, kType, "one"}));
+  succeed(state_->intents.finish(number));
+  restart();
+  EXPECT_THAT(clients(true), ElementsAre("one", "two"));
+  EXPECT_TRUE(holdsCredential("one"));
+  EXPECT_TRUE(state_->log.lines().empty());
+}
+
+TEST_F(InterruptedWork, RevokesTheClientAndLeavesTheOthersAlone) {
+  succeed(state_->records->put(
+      {kType, "one", true, RVPermissionSet{"email"}, RVDictionary{{"app_id", "1"}}, {}}));
+  valueOf(state_->intents.begin({records::Intent::Kind::kRevokeClient, kType, "one"}));
+  restart();
+  const auto record = state_->records->find(kType, "one");
+  ASSERT_TRUE(record);
+  EXPECT_FALSE(record->granted);
+  EXPECT_FALSE(record->permissions);
+  EXPECT_TRUE(record->options == RVDictionary({{"app_id", "1"}}));
+  EXPECT_FALSE(holdsCredential("one"));
+  EXPECT_TRUE(holdsCredential("two"));
+  EXPECT_THAT(state_->log.texts(), Contains(HasSubstr("access of one to " + kType + " was interrupted")));
+  restart();
+  EXPECT_TRUE(state_->log.lines().empty());
+}
+
+TEST_F(InterruptedWork, MakesNoRefusalOfAClientWithoutARecord) {
+  valueOf(state_->intents.begin({records::Intent::Kind::kRevokeClient, kType, "three"}));
+  restart();
+  EXPECT_FALSE(state_->records->find(kType, "three"));
+}
+
+TEST_F(InterruptedWork, RevokesAll) {
+  valueOf(state_->intents.begin({records::Intent::Kind::kRevokeAll, kType, ""}));
+  restart();
+  EXPECT_THAT(clients(), IsEmpty());
+  EXPECT_FALSE(holdsCredential("one"));
+  EXPECT_FALSE(holdsCredential("two"));
+  EXPECT_NE(state_->keychain->credentialForAccount(*state_->account(), std::nullopt), nullptr);
+}
+
+TEST_F(InterruptedWork, RemovesTheAccount) {
+  valueOf(state_->intents.begin({records::Intent::Kind::kRemoveAccount, kType, account_}));
+  restart();
+  EXPECT_THAT(clients(), IsEmpty());
+  EXPECT_TRUE(state_->accounts->list().empty());
+  // Also where the account had gone already.
+  valueOf(state_->intents.begin({records::Intent::Kind::kRemoveAccount, kType, account_}));
+  restart();
+  restart();
+  EXPECT_TRUE(state_->log.lines().empty());
+}
+
+}  // namespace

@@ -1,0 +1,5 @@
+rvd_test(storage_tests
+  SOURCES unit/credentials_key_test.cpp unit/credentials_keychain_test.cpp unit/preferences_test.cpp
+    unit/records_damage_test.cpp unit/records_database_test.cpp unit/records_test.cpp
+    unit/records_void_request_test.cpp unit/state_directory_test.cpp unit/state_value_text_test.cpp
+  LIBRARIES rvd_credentials rvd_records rvd_preferences rvd_fakes)
