@@ -1,4 +1,5 @@
 // rvctl access
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -19,9 +20,9 @@ base::Failure unusable(const char* message) {
 base::Result<void> checkCredentialDescriptor(int descriptor) {
   if (descriptor <= STDERR_FILENO)
     return unusable("--credential-fd takes a descriptor of its own, from 3 on: rvctl … 3>FILE");
-  // Nothing is written yet; the call only says whether the descriptor could be written to.
-  if (::write(descriptor, "", 0) != 0)
-    return unusable("The descriptor of --credential-fd cannot be written to");
+  const int mode = ::fcntl(descriptor, F_GETFL);
+  if (mode < 0 || (mode & O_ACCMODE) == O_RDONLY)
+    return unusable("The descriptor of --credential-fd is not open for writing");
   if (::isatty(descriptor) == 1) return unusable("A credential is not written to a terminal");
   return {};
 }

@@ -93,17 +93,13 @@ std::vector<std::string> namesIn(const std::string& list) {
 
 void addAccountCommands(CommandLine& line) {
   CLI::App* group = addGroup(line, "account", "Add, list and remove accounts");
-  CLI::App* adding = addCommand(line,
-                                group,
-                                "add",
-                                "Set up an account; its token is read from standard input",
-                                [&line](Session& session) {
-                                  const auto descriptor =
-                                      numberFrom<int>(line.descriptor.value_or("0"),
-                                                      "--token-fd takes the number of a file descriptor");
-                                  if (!descriptor) return session.output.failed(descriptor.failure());
-                                  return addAccount(session, *line.subject, *descriptor);
-                                });
+  CLI::App* adding = addCommand(
+      line, group, "add", "Set up an account; its token comes from stdin", [&line](Session& session) {
+        const auto descriptor = numberFrom<int>(line.descriptor.value_or("0"),
+                                                "--token-fd takes the number of a file descriptor");
+        if (!descriptor) return session.output.failed(descriptor.failure());
+        return addAccount(session, *line.subject, *descriptor);
+      });
   addSubject(line, adding, "USERNAME", "the account's user name");
   addText(adding, "--token-fd", line.descriptor, "N", "read the token from this file descriptor instead");
   addCommand(line, group, "list", "List the accounts", listAccounts);
@@ -140,11 +136,7 @@ void addAccessCommand(CommandLine& line) {
         return showAccess(session, line.as, descriptor);
       });
   addText(command, "--as", line.as, "APP_ID", "look as this installed application");
-  addText(command,
-          "--credential-fd",
-          line.descriptor,
-          "N",
-          "write its token to this file descriptor (3 or more)");
+  addText(command, "--credential-fd", line.descriptor, "N", "write its token to this descriptor, 3 or more");
 }
 
 void addAuthorizationCommands(CommandLine& line) {

@@ -63,7 +63,9 @@ class TerminalAgent {
 
   void waitAndTakeInput() {
     const auto bus = connection_.getEventLoopPollData();
-    std::array<pollfd, 3> polled{{{bus.fd, bus.events, 0}, {input_, POLLIN, 0}, {stop_, POLLIN, 0}}};
+    // Until the daemon has taken this agent, the end of the input is not what ends it.
+    const int input = wasRegistered_ ? input_ : -1;
+    std::array<pollfd, 3> polled{{{bus.fd, bus.events, 0}, {input, POLLIN, 0}, {stop_, POLLIN, 0}}};
     if (::poll(polled.data(), polled.size(), bus.getPollTimeout()) < 0) {
       if (errno != EINTR) failure_ = failed("Waiting for input failed");
       return;
