@@ -138,7 +138,6 @@ class Position {
     return *this;
   }
   friend bool operator==(const Position& a, const Position& b) { return a.at_ == b.at_; }
-  friend bool operator!=(const Position& a, const Position& b) { return a.at_ != b.at_; }
 
  private:
   const char* at_;
