@@ -120,8 +120,8 @@ TEST_F(TheAccount, IsAbsentWithoutALogLineWhereThereIsNoneOfItsType) {
 
 class ThePreferenceToIgnoreRequests : public PluginTest {
  protected:
-  void store(std::optional<RVValue> value) {
-    host.preferences.store(TKFacebookIgnoreAccessRequests, TKFacebookPreferencesAppID, std::move(value));
+  void storeTrue() {
+    host.preferences.store(TKFacebookIgnoreAccessRequests, TKFacebookPreferencesAppID, true);
   }
 };
 
@@ -130,7 +130,7 @@ TEST_F(ThePreferenceToIgnoreRequests, IsFalseWhereNothingIsStored) {
 }
 
 TEST_F(ThePreferenceToIgnoreRequests, IsTrueOnEveryCallWhereTrueIsStored) {
-  store(true);
+  storeTrue();
   EXPECT_TRUE(access.shouldIgnoreAccessRequest());
   EXPECT_TRUE(access.shouldIgnoreAccessRequest());
   EXPECT_TRUE(access.shouldIgnoreAccessRequest());
@@ -138,27 +138,25 @@ TEST_F(ThePreferenceToIgnoreRequests, IsTrueOnEveryCallWhereTrueIsStored) {
 }
 
 TEST_F(ThePreferenceToIgnoreRequests, IsReadAsTheHostReadsBooleans) {
-  const std::vector<std::pair<RVValue, bool>> readings = {
-      {false, false},
-      {true, true},
-      {0, false},
-      {1, true},
-      {-7, true},
-      {0.0, false},
-      {0.5, true},
-      {"YES", true},
-      {"no", false},
-      {"", false},
-      {RVValue(), false},
-      {RVArray{true}, false},
-      {RVDictionary{{"true", true}}, false},
-  };
   access.shouldIgnoreAccessRequest();  // registers
-  for (std::size_t i = 0; i < readings.size(); ++i) {
-    store(readings[i].first);
+  const auto readingOf = [&](const RVValue& value) {
+    host.preferences.store(TKFacebookIgnoreAccessRequests, TKFacebookPreferencesAppID, value);
     host.notifications.post(TKFacebookEnvironmentDidChangeNotification);
-    EXPECT_EQ(access.shouldIgnoreAccessRequest(), readings[i].second) << "reading " << i;
-  }
+    return access.shouldIgnoreAccessRequest();
+  };
+  EXPECT_TRUE(readingOf(true));
+  EXPECT_TRUE(readingOf(1));
+  EXPECT_TRUE(readingOf(-7));
+  EXPECT_TRUE(readingOf(0.5));
+  EXPECT_TRUE(readingOf("YES"));
+  EXPECT_FALSE(readingOf(false));
+  EXPECT_FALSE(readingOf(0));
+  EXPECT_FALSE(readingOf(0.0));
+  EXPECT_FALSE(readingOf("no"));
+  EXPECT_FALSE(readingOf(""));
+  EXPECT_FALSE(readingOf(RVValue()));
+  EXPECT_FALSE(readingOf(RVArray(1, true)));
+  EXPECT_FALSE(readingOf(RVDictionary{{"true", true}}));
 }
 
 TEST_F(ThePreferenceToIgnoreRequests, IsReadOnThePreferencesQueueForTheCurrentUserOnAnyHost) {
@@ -193,7 +191,7 @@ TEST_F(ThePreferenceToIgnoreRequests, RegistersBeforeItIsReadForTheFirstTime) {
 TEST_F(ThePreferenceToIgnoreRequests, SharesQueueAndRegistrationWithASecondObject) {
   access.shouldIgnoreAccessRequest();
   const Plugin second(host.services());
-  store(true);
+  storeTrue();
   const Access accessToSecond{second};
   host.notifications.post(TKFacebookEnvironmentDidChangeNotification);
   EXPECT_TRUE(accessToSecond.shouldIgnoreAccessRequest());
@@ -214,7 +212,7 @@ TEST_F(ThePreferenceToIgnoreRequests, OutlivesTheObjectThatRegistered) {
 
 TEST_F(ThePreferenceToIgnoreRequests, ShowsAChangeOnlyAfterTheEnvironmentChanged) {
   EXPECT_FALSE(access.shouldIgnoreAccessRequest());
-  store(true);
+  storeTrue();
   EXPECT_FALSE(access.shouldIgnoreAccessRequest());
   host.notifications.post("SomeOtherNotification");
   EXPECT_FALSE(access.shouldIgnoreAccessRequest());
@@ -235,7 +233,7 @@ TEST_F(ThePreferenceToIgnoreRequests, IsSynchronisedOnThePreferencesQueueAndNoth
 }
 
 TEST_F(ThePreferenceToIgnoreRequests, IsSetUpOnceWhenManyThreadsReadItFirst) {
-  store(true);
+  storeTrue();
   std::vector<std::thread> threads;
   std::atomic<int> ignored = 0;
   for (int i = 0; i < 8; ++i)
@@ -250,7 +248,7 @@ TEST_F(ThePreferenceToIgnoreRequests, RegistersTheNextTimeWhereTheHostThrewAtThe
   host.notifications.setBeforeCall([](std::string_view) { throw std::runtime_error("no notifications"); });
   EXPECT_THROW(access.shouldIgnoreAccessRequest(), std::runtime_error);
   host.notifications.setBeforeCall(nullptr);
-  store(true);
+  storeTrue();
   EXPECT_TRUE(access.shouldIgnoreAccessRequest());
   EXPECT_EQ(host.serialQueues.labels().size(), 1U);
   EXPECT_EQ(host.notifications.registrations().size(), 1U);

@@ -1,6 +1,7 @@
 // What the server says about permissions that the plug-in does not know.
 #include <future>
 #include <stdexcept>
+#include <thread>
 
 #include "tests/unit/plugin_words_fixture.h"
 
@@ -11,6 +12,43 @@ using fakes::FakeReply;
 using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::Pair;
+
+// A host that answers and then keeps the handler for as long as it lives.
+class KeptHandler final : public TKFacebookRequestFactory {
+ public:
+  ~KeptHandler() { thread_.join(); }
+  std::shared_ptr<TKFacebookAuthorizationRequest> initWithAppId(const std::string&,
+                                                                const std::string&,
+                                                                const std::optional<RVPermissionSet>&,
+                                                                const std::optional<std::string>&) override {
+    return nullptr;
+  }
+  std::shared_ptr<TKFacebookPermissionDescriptionRequest> initWithPermissions(
+      const RVPermissionSet&,
+      const std::optional<std::string>&) override {
+    return std::make_shared<Request>(*this);
+  }
+  std::shared_ptr<TKFacebookSession> initSession() override { return nullptr; }
+
+ private:
+  class Request final : public TKFacebookPermissionDescriptionRequest {
+   public:
+    explicit Request(KeptHandler& owner)
+        : owner_(owner) {}
+    void setAccessToken(std::optional<RVSecret>) override {}
+    void performRequestWithHandler(TKFacebookRequestHandler handler) override {
+      owner_.handler_ = std::move(handler);
+      owner_.thread_ = std::thread(
+          [&owner = owner_] { owner.handler_(R"("It plays music.")", TKHTTPResponse{200}, std::nullopt); });
+    }
+
+   private:
+    KeptHandler& owner_;
+  };
+
+  TKFacebookRequestHandler handler_;
+  std::thread thread_;
+};
 
 class ADescription : public WordsTest {
  protected:
@@ -190,6 +228,16 @@ TEST_F(ADescription, IsWaitedForUntilTheAnswerComes) {
   EXPECT_EQ(answer.wait_for(std::chrono::seconds(0)), std::future_status::timeout);
   host.facebookRequests.releaseHeld();
   EXPECT_EQ(answer.get(), "late");
+}
+
+TEST_F(ADescription, IsThereWhenTheHandlerHasRunThoughTheHostKeepsIt) {
+  KeptHandler requests;
+  RVDHostServices services = host.services();
+  services.facebookRequests = &requests;
+  const TKFacebookAccountAccessPlugin other(services);
+  EXPECT_EQ(TKFacebookAccountAccessPluginTestAccess{other}.fetchDescriptionForUnknownPermissions(
+                {"play_music"}, std::nullopt, account),
+            "It plays music.");
 }
 
 TEST_F(ADescription, OfEachOfTwoCallersIsItsOwn) {

@@ -1,6 +1,4 @@
 // What the user reads, in English: whole sentences, word for word.
-#include <regex>
-
 #include "tests/support/Sentences.h"
 #include "tests/unit/plugin_words_fixture.h"
 
@@ -22,16 +20,15 @@ class TheEnglishAlert : public testing::Test {
   support::SentenceMaker maker;
 };
 
-// What holds for every sentence, whatever it says.
+// What holds for every sentence, whatever it says. Raw keys and permissions' names have underscores.
 void expectFinished(const std::string& message, const ConsentRequest& request) {
   std::string context;
   for (const std::string& permission : request.permissions) context += permission + " ";
   SCOPED_TRACE(context + request.audience.value_or("") + ": " + message);
-  EXPECT_TRUE(std::regex_search(message, std::regex("\\.(”)?$")));
+  EXPECT_TRUE(message.ends_with(".") || message.ends_with(".”"));
   EXPECT_TRUE(message.starts_with("If you allow this, “Photo App” will be able to "));
-  EXPECT_FALSE(std::regex_search(message, std::regex("[A-Z]+_[A-Z]+"))) << "a raw key";
-  EXPECT_FALSE(std::regex_search(message, std::regex("[a-z]+_[a-z]+"))) << "a permission's name";
-  for (const char* leftover : {"  ", "%", "(null)", "$@", " ,", " .", "..", ",,", "your your", "and and"})
+  for (const char* leftover :
+       {"_", "  ", "%", "(null)", "$@", " ,", " .", "..", ",,", "your your", "and and"})
     EXPECT_THAT(message, Not(HasSubstr(leftover)));
 }
 

@@ -178,7 +178,29 @@ TEST_F(StoredRecords, CanBeWrittenAndReadFromManyThreads) {
   EXPECT_EQ(clients(true).size(), 4U);
 }
 
-class StoredAccounts : public StoredRecords {};
+class StoredAccounts : public StoredRecords {
+ protected:
+  std::string add(const std::string& type, const std::string& username) {
+    const std::string id = valueOf(state_->accounts->add(type, username)).identifier;
+    succeed(state_->keychain->setMasterCredential(id, RVSecret("master")));
+    return id;
+  }
+};
+
+TEST_F(StoredAccounts, ThatWereNotSetUpToTheEndAreGoneAtTheNextStart) {
+  const std::string whole = add(kType, "whole");
+  valueOf(state_->accounts->add(kType, "half"));
+  reopen();
+  ASSERT_EQ(state_->accounts->list().size(), 1U);
+  EXPECT_EQ(state_->accounts->list().at(0).identifier, whole);
+}
+
+TEST_F(StoredAccounts, StayWhereTheKeyOfTheirCredentialsIsLost) {
+  add(kType, "me");
+  std::filesystem::remove(path_ + "/credentials.key");
+  reopen();
+  EXPECT_EQ(state_->accounts->list().size(), 1U);
+}
 
 TEST_F(StoredAccounts, KeepTheirOrderAndTheirNames) {
   using std::string_literals::operator""s;
@@ -186,13 +208,13 @@ TEST_F(StoredAccounts, KeepTheirOrderAndTheirNames) {
   std::set<std::string> unique;
   for (const std::string& username : {"zoe"s, "adam"s, "zoe"s, ""s, "\xff\0"s}) {
     added.push_back(username);
-    unique.insert(valueOf(state_->accounts->add(kType, username)).identifier);
+    unique.insert(add(kType, username));
   }
   EXPECT_EQ(unique.size(), added.size());
   succeed(state_->accounts->remove(state_->accounts->list().at(1).identifier));
   added.erase(added.begin() + 1);
   added.push_back("last");
-  valueOf(state_->accounts->add("other", "last"));
+  add("other", "last");
   for (int round = 0; round < 2; ++round) {
     std::vector<std::string> listed;
     for (const auto& account : state_->accounts->list()) {
