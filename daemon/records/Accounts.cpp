@@ -33,6 +33,12 @@ Accounts::Accounts(Database& database, state::IdentifierSource newIdentifier)
 base::Result<std::unique_ptr<Accounts>> Accounts::load(Database& database,
                                                        state::IdentifierSource newIdentifier) {
   std::unique_ptr<Accounts> accounts(new Accounts(database, std::move(newIdentifier)));
+  auto removed = database.write([](Connection& connection) {
+    return connection.run(
+        "DELETE FROM accounts WHERE NOT EXISTS (SELECT 1 FROM credentials WHERE account = "
+        "accounts.identifier AND client_id IS NULL)");
+  });
+  if (!removed) return removed.failure();
   if (auto read = accounts->reload(); !read) return read.failure();
   return accounts;
 }

@@ -23,11 +23,12 @@ struct AccountRecord {
 // Reads come from memory; a write is on the disk when it returns. Thread-safe.
 class Accounts {
  public:
-  // The database outlives the object.
+  // Removes what an interrupted run left half set up: an account whose own credential was never stored
+  // (SealedKeychain::setMasterCredential), of which nobody was told yet. The database outlives the object.
   static base::Result<std::unique_ptr<Accounts>> load(Database& database,
                                                       state::IdentifierSource newIdentifier);
 
-  // Answers the new account.
+  // Answers the new account. It is set up, and stays, once its own credential is stored.
   base::Result<AccountRecord> add(const std::string& accountType, const std::string& username);
 
   // In the order in which they were added.
