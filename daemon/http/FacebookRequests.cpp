@@ -69,6 +69,8 @@ class Exchange {
     }
     const RequestContext::Scope scope(context_);
     const TKFacebookRequestHandler handler = std::exchange(handler_, nullptr);
+    // Before the caller is answered, who may then ask again at once.
+    waiting_.reset();
     handler(body, response, error);
   }
 

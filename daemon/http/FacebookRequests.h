@@ -26,7 +26,7 @@ inline constexpr std::chrono::seconds kRevocationGrace{3};
 // Makes requests to one server.
 //
 // A request belongs to the RequestContext that is current when it is performed: the context waits until
-// the handler has run, the exchange is ended when the context becomes void, and the handler runs with
+// the answer has come, the exchange is ended when the context becomes void, and the handler runs with
 // the context as the current one. A void context's request is answered with an error and sends nothing.
 // A revocation belongs to no context, since nobody waits for it: it is sent whatever becomes of the
 // request that asked for it, and its failure is logged.
