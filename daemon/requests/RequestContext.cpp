@@ -29,8 +29,13 @@ std::optional<VoidReason> RequestContext::voidReason() const {
 }
 
 void RequestContext::makeVoid(VoidReason reason) {
+  beginVoid(reason);
+  // Whoever gets this lock from now on sees the reason; whoever had it has written.
+  const std::lock_guard effects(effects_);
+}
+
+void RequestContext::beginVoid(VoidReason reason) {
   {
-    const std::lock_guard effects(effects_);
     const std::lock_guard lock(reasonMutex_);
     if (reason_) return;
     reason_ = reason;

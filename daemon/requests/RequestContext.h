@@ -53,9 +53,12 @@ class RequestContext {
   std::optional<VoidReason> voidReason() const;
 
   // Makes the request void and runs what was registered with onVoid, on this thread. Waits for an
-  // effect that is being written (see unlessVoid); once this has returned, none begins. The first reason
-  // stays.
+  // effect that is being written (see unlessVoid); once this has returned, none is written any more. The
+  // first reason stays.
   void makeVoid(VoidReason reason);
+
+  // The same without waiting: an effect that is being written may still come to its end, but none begins.
+  void beginVoid(VoidReason reason);
 
   // Unregisters when it is dropped; the callback does not run after that, nor is it still running.
   class Registration {
@@ -121,7 +124,7 @@ class RequestContext {
 
   // Locks are taken in this order: effects_, reasonMutex_; callbacksMutex_, reasonMutex_; waitingMutex_,
   // the limiter's own.
-  std::recursive_mutex effects_;  // held while an effect is written, and while the reason is set
+  std::recursive_mutex effects_;  // held while an effect is written
   mutable std::mutex reasonMutex_;
   std::optional<VoidReason> reason_;
 

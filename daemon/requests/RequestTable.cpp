@@ -207,11 +207,7 @@ void RequestTable::callerLeft(const std::string& name) {
       while (entry != end) entry = entry->second == request ? requests_.erase(entry) : std::next(entry);
     }
   }
-  if (abandoned.empty()) return;
-  const auto makeThemVoid = [abandoned] {
-    for (const auto& request : abandoned) request->context->makeVoid(VoidReason::kCallerGone);
-  };
-  if (!pool_.submit(makeThemVoid)) makeThemVoid();
+  for (const auto& request : abandoned) request->context->beginVoid(VoidReason::kCallerGone);
 }
 
 RequestTable::Barrier RequestTable::makeVoid(VoidReason reason, Selection selection) {

@@ -83,7 +83,8 @@ class RequestTable {
   // As submit, but never made one with another request.
   void submitAlone(RequestKey key, Caller caller, std::shared_ptr<WaitingLimiter> limiter, Work work);
 
-  // Forgets the caller's share in its requests. Those that nobody is left to ask for become void, soon.
+  // Forgets the caller's share in its requests. Those that nobody is left to ask for become void; an
+  // effect that is being written is not waited for.
   void callerLeft(const std::string& name);
 
   using Selection = std::function<bool(const RequestKey&)>;

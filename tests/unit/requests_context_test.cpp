@@ -66,6 +66,26 @@ TEST_F(ARequest, BecomesVoidOnlyBeforeOrAfterAnEffectThatIsBeingWritten) {
   }
 }
 
+TEST_F(ARequest, CanBeginToBeVoidWithoutWaitingForAnEffectThatIsBeingWritten) {
+  std::latch isWriting(1);
+  std::latch mayEnd(1);
+  bool hasWritten = false;
+  std::thread writer([&] {
+    context_->unlessVoid([&] {
+      isWriting.count_down();
+      mayEnd.wait();
+      hasWritten = true;
+    });
+    EXPECT_FALSE(context_->unlessVoid([] {}));
+  });
+  isWriting.wait();
+  context_->beginVoid(VoidReason::kCallerGone);
+  EXPECT_TRUE(context_->isVoid());
+  mayEnd.count_down();
+  writer.join();
+  EXPECT_TRUE(hasWritten);
+}
+
 TEST_F(ARequest, TellsThoseWhoAskedWhenItBecomesVoid) {
   int told = 0;
   const auto registration = context_->onVoid([&] { ++told; });
