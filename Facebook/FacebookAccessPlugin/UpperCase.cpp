@@ -35,7 +35,7 @@ Character firstCharacter(std::string_view text) {
   const auto lead = static_cast<unsigned char>(text[0]);
   if (lead < 0x80) return {lead, 1};
   const std::size_t size = lead >= 0xF0 ? 4 : lead >= 0xE0 ? 3 : 2;
-  if (lead < 0xC2 || lead > 0xF4 || text.size() < size) return kNone;
+  if (lead < 0xC0 || lead > 0xF4 || text.size() < size) return kNone;
   char32_t code = lead & (0x7F >> size);
   for (std::size_t i = 1; i < size; ++i) {
     const auto byte = static_cast<unsigned char>(text[i]);
@@ -43,8 +43,8 @@ Character firstCharacter(std::string_view text) {
     code = code << 6 | (byte & 0x3F);
   }
   constexpr char32_t kSmallestOfSize[] = {0, 0, 0x80, 0x800, 0x10000};
-  const bool isSurrogate = code >= 0xD800 && code <= 0xDFFF;
-  if (code < kSmallestOfSize[size] || code > 0x10FFFF || isSurrogate) return kNone;
+  if (code < kSmallestOfSize[size]) return kNone;
+  // A surrogate or a number beyond the last code point has no upper case: it will be written as it was read.
   return {code, size};
 }
 

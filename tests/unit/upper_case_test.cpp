@@ -52,6 +52,8 @@ TEST(UpperCasing, LeavesBytesThatAreNoTextAsTheyAre) {
       "\xED\xBF\xBF",      // last surrogate
       "\xF4\x90\x80\x80",  // beyond the last code point
       "\xF5\x80\x80\x80",  // no lead
+      "\xF8\x88\x80\x80",  // the same
+      "\xFF\xBF\xBF\xBF",  // the same
       "\xFF",              // the same
       "\xC3",              // cut off
       "\xE1\xBA",          // the same
@@ -67,6 +69,12 @@ TEST(UpperCasing, GoesOnRightAfterAByteThatIsNoText) {
   EXPECT_EQ(upperCased("\xC3z"), "\xC3Z");
   EXPECT_EQ(upperCased("\xE1\xBAz"), "\xE1\xBAZ");
   EXPECT_EQ(upperCased("\xF0é"), "\xF0É");
+}
+
+TEST(UpperCasing, ReadsNothingBehindTheText) {
+  EXPECT_EQ(upperCased(std::string_view("é", 1)), "\xC3");
+  EXPECT_EQ(upperCased(std::string_view("ꭰ", 2)), std::string("ꭰ", 2));
+  EXPECT_EQ(upperCased(std::string_view("𐐨", 3)), std::string("𐐨", 3));
 }
 
 TEST(UpperCasing, KeepsZeroBytes) {
