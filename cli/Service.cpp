@@ -41,7 +41,7 @@ base::Failure failureFor(const sdbus::Error& error) {
     return {FailureKind::kRefused,
             "There is no access to hand a credential out for. Ask with: rvctl request"};
   if (name == base::kUnknownApplication)
-    return {FailureKind::kFailed, "No installed application has this ID: " + message};
+    return {FailureKind::kFailed, "No application of this ID is installed: it has no desktop entry"};
   if (name == base::kUnsupportedAccountType)
     return {FailureKind::kFailed, "rvd has no plug-in for Facebook accounts. See its log and --plugin-dir"};
   if (name == base::kLimitsExceeded) return {FailureKind::kFailed, "rvd's limits are exceeded: " + message};

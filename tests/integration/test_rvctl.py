@@ -645,7 +645,7 @@ def test_an_error_that_nobody_knows_is_no_success(tools, rvd, arguments, method)
     "name, words",
     [
         ("com.zentor.rvd.Error.UnsupportedAccountType", "no plug-in"),
-        ("com.zentor.rvd.Error.UnknownApplication", "No installed application"),
+        ("com.zentor.rvd.Error.UnknownApplication", "desktop entry"),
         ("com.zentor.rvd.Error.LimitsExceeded", "limits"),
         ("com.zentor.rvd.Error.AlreadyIdentified", "why"),
         (INVALID_ARGS, "why"),
