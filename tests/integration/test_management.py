@@ -1,12 +1,13 @@
 """What the device's user does: accounts, direct grants, revocations, refusals forgotten."""
 
 import os
+import sqlite3
 
 import pytest
 from gi.repository import GLib
 
 from harness.agent import ALLOW, REFUSE
-from harness.application import FACEBOOK
+from harness.application import FACEBOOK, Application, Manager
 from harness.bus import ACCOUNTS, MANAGEMENT
 from harness.expect import (
     FAILED,
@@ -31,6 +32,26 @@ def granted(wired_world):
     application = wired_world.application()
     assert application.request(["email", "publish_stream"], audience="friends") == GRANTED
     return application
+
+
+class Unwritable:
+    """As long as it lasts, no record can be written or removed."""
+
+    def __init__(self, world):
+        self._database = sqlite3.connect(os.path.join(world.state_dir, "accounts.db"))
+
+    def __enter__(self):
+        for what in ("INSERT", "UPDATE", "DELETE"):
+            self._run(f"CREATE TRIGGER no_{what} BEFORE {what} ON authorizations BEGIN SELECT RAISE(ABORT, 'full'); END")
+
+    def __exit__(self, *_):
+        for what in ("INSERT", "UPDATE", "DELETE"):
+            self._run(f"DROP TRIGGER no_{what}")
+        self._database.close()
+
+    def _run(self, statement):
+        self._database.execute(statement)
+        self._database.commit()
 
 
 # ---- accounts ----
@@ -165,6 +186,14 @@ def test_a_request_whose_account_is_removed_is_not_granted_and_its_alert_goes(wo
     assert manager.access_log() == []
 
 
+def test_a_request_right_after_the_removal_is_an_ordinary_one(world):
+    manager = world.manager()
+    asking = Application(manager.connection)  # nothing lies between the answer and the request
+    for _ in range(100):
+        manager.remove_account(manager.add_account())
+        assert asking.request(["email"]) == NO_ACCOUNT
+
+
 # ---- direct grants ----
 
 
@@ -250,7 +279,7 @@ def test_a_revoked_client_is_refused_at_once_and_its_token_is_dead(wired_world, 
     newest = manager.access_log()[0]
     assert (newest["client_id"], newest["granted"], newest["requested"]) == (PHOTO, False, False)
     assert changed.wait() == [(FACEBOOK,)]
-    assert everyone.wait() == [(FACEBOOK,)]
+    assert set(everyone.wait()) == {(FACEBOOK,)}
     exchange = wire.next()
     while exchange.path != "/revoke":
         exchange = wire.next()
@@ -294,6 +323,17 @@ def test_revoking_everyone_forgets_everyone(wired_world, wire, granted):
     assert agent_answers.asked() == 1
     agent_answers.answer = ALLOW
     assert other.request(["email"]) == GRANTED
+
+
+def test_a_request_right_after_everyone_was_revoked_is_an_ordinary_one(world):
+    manager = world.manager()
+    manager.add_account()
+    world.agent(answer=ALLOW)
+    application = world.application()
+    asking = Manager(application.connection)
+    for _ in range(100):
+        assert application.request(["email"]) == GRANTED
+        assert asking.revoke_all() == GRANTED
 
 
 def test_a_waiting_request_of_a_client_that_is_revoked_is_not_granted(world):
@@ -398,3 +438,29 @@ def test_a_client_that_is_not_installed_any_more_is_listed_by_its_id(world):
     os.unlink(os.path.join(world.root, "home/data/applications", f"{PHOTO}.desktop"))
     assert manager.authorizations()[PHOTO]["name"] == PHOTO
     assert manager.revoke(PHOTO) == GRANTED
+
+
+# ---- a disk that takes nothing ----
+
+
+@pytest.mark.parametrize("take_back", [lambda m: m.revoke(PHOTO), lambda m: m.revoke_all()], ids=["one", "all"])
+def test_a_revocation_that_cannot_be_written_down_is_not_acknowledged(wired_world, granted, take_back):
+    manager = wired_world.manager()
+    with Unwritable(wired_world):
+        with bus_error(FAILED):
+            take_back(manager)
+    assert take_back(manager) == (True, {})
+    assert granted.access()[0] != "granted"
+
+
+def test_an_account_whose_clients_cannot_be_revoked_stays(wired_world, granted):
+    manager = wired_world.manager()
+    (account,) = manager.accounts()
+    with Unwritable(wired_world):
+        with bus_error(FAILED):
+            manager.remove_account(account["id"])
+    assert manager.accounts() == [account]
+    manager.remove_account(account["id"])
+    assert manager.accounts() == []
+    manager.add_account("another-token")
+    assert granted.access()[0] == "none"
