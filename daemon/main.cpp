@@ -46,6 +46,7 @@ void protectProcess() {
   const rlimit none{0, 0};
   ::setrlimit(RLIMIT_CORE, &none);
   ::umask(077);
+  ::unsetenv("SSLKEYLOGFILE");  // a file for the keys of connections
 }
 
 // SIGTERM and SIGINT, to be read instead of being delivered; called before there is a second thread.

@@ -60,15 +60,18 @@ RVPermissionSet TKFacebookAccountAccessPlugin::permissionsGrantedByServer(
     const std::shared_ptr<RVAccount>& account) const {
   // Shared: the thread of the answer may still be at the semaphore when this one is on its way again.
   const auto pending = std::make_shared<PendingGrant>();
+  // Goes with the completion, so that the wait ends as well where that throws.
+  Owed<void()> arrived([pending] { pending->arrived.release(); });
   _getServerAuthorizationForClient(
       client,
       appID,
       std::nullopt,
       std::nullopt,
       account,
-      [pending](bool, const std::optional<RVArray>& grantedPermissions, const std::optional<RVError>&) {
+      [pending, arrived = std::move(arrived)](
+          bool, const std::optional<RVArray>& grantedPermissions, const std::optional<RVError>&) {
         pending->permissions = permissionNames(grantedPermissions ? &*grantedPermissions : nullptr);
-        pending->arrived.release();
+        arrived();
       });
   pending->arrived.acquire();
   return std::move(pending->permissions);

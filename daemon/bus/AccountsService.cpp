@@ -24,7 +24,7 @@ RVDictionary detailsOf(const clients::Client& client) {
   return details;
 }
 
-// Writes a secret as a variant; no copy of it stays behind on our side.
+// Writes a secret as a variant; no copy of it stays behind but the message, which the library frees.
 void writeSecret(sdbus::Message& message, const RVSecret& secret) {
   std::string text(secret.reveal());
   message.openVariant("s");
@@ -36,6 +36,18 @@ void writeSecret(sdbus::Message& message, const RVSecret& secret) {
   }
   RVSecret::wipe(text.data(), text.size());
   message.closeVariant();
+}
+
+// A name's bytes; of something that is no name, as many as it has parts and bytes of text, since it may
+// be remembered all the same.
+std::size_t bytesOf(const RVValue& value) {
+  if (value.string() != nullptr) return value.string()->size();
+  std::size_t bytes = 1;
+  if (value.array() != nullptr)
+    for (const RVValue& element : *value.array()) bytes += bytesOf(element);
+  if (value.dictionary() != nullptr)
+    for (const auto& [key, element] : *value.dictionary()) bytes += key.size() + bytesOf(element);
+  return bytes;
 }
 
 void writeCredential(sdbus::Message& message, const RVAccountCredential& credential) {
@@ -104,7 +116,7 @@ void AccountsService::registerCaller(const std::shared_ptr<Call>& call) {
 void AccountsService::checkSizes(const RVDictionary& options) const {
   const auto& settings = parts_.settings;
   const auto checkName = [&](const RVValue& value) {
-    if (value.string() != nullptr && value.string()->size() > settings.nameBytes)
+    if (bytesOf(value) > settings.nameBytes)
       throw sdbus::Error(kLimitsExceeded, "A name in the options is too long");
   };
   for (const auto& [key, value] : options) {
@@ -174,8 +186,10 @@ void AccountsService::getCredential(const std::shared_ptr<Call>& call) {
   if (!client) throw sdbus::Error(kNoAccess, "The caller holds no access");
   dispatcher_.onPool(call, [this, call, accountType, id = client->id] {
     const auto accounts = parts_.accounts.listOfType(accountType);
-    const auto credential =
-        accounts.empty() ? nullptr : parts_.keychain.credentialForClient(accounts.front().identifier, id);
+    const auto record = parts_.records.find(accountType, id);
+    const auto credential = accounts.empty() || !record || !record->granted
+                                ? nullptr
+                                : parts_.keychain.credentialForClient(accounts.front().identifier, id);
     if (credential == nullptr) throw sdbus::Error(kNoAccess, "The caller holds no access");
     call->reply([&](sdbus::MethodReply& reply) { writeCredential(reply, *credential); });
   });

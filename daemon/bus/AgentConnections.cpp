@@ -38,13 +38,16 @@ AgentConnections::AgentConnections(sdbus::IConnection& connection, BusLoop& loop
 
 AgentConnections::~AgentConnections() = default;
 
-void AgentConnections::add(const alerts::AgentAddress& agent) {
+std::shared_ptr<sdbus::IProxy> AgentConnections::makeProxy(const alerts::AgentAddress& agent) {
   // A proxy goes on the bus thread, outside a handler: that is where its answers arrive.
   const auto dropOnBusThread = [&loop = loop_](sdbus::IProxy* proxy) {
     loop.post([owned = std::shared_ptr<sdbus::IProxy>(proxy)] {});
   };
-  std::shared_ptr<sdbus::IProxy> proxy(sdbus::createProxy(connection_, agent.name, agent.path).release(),
-                                       dropOnBusThread);
+  return {sdbus::createProxy(connection_, agent.name, agent.path).release(), dropOnBusThread};
+}
+
+void AgentConnections::add(const alerts::AgentAddress& agent) {
+  auto proxy = makeProxy(agent);
   const std::lock_guard lock(mutex_);
   proxies_.try_emplace({agent.name, agent.path}, std::move(proxy));
 }
@@ -88,8 +91,9 @@ void AgentConnections::showAlert(const alerts::AgentAddress& agent,
 }
 
 void AgentConnections::dismissAlert(const alerts::AgentAddress& agent, const std::string& alertID) {
-  const auto proxy = find(agent);
-  if (proxy == nullptr) return;
+  // An agent that has unregistered may still show the alert.
+  auto proxy = find(agent);
+  if (proxy == nullptr) proxy = makeProxy(agent);
   auto call = proxy->createMethodCall(interfaces::kAgent1, "DismissAlert");
   call << alertID;
   call.dontExpectReply();

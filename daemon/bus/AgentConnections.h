@@ -35,6 +35,7 @@ class AgentConnections final : public alerts::AgentCaller {
 
  private:
   using Key = std::pair<std::string, std::string>;  // name and path
+  std::shared_ptr<sdbus::IProxy> makeProxy(const alerts::AgentAddress& agent);
   std::shared_ptr<sdbus::IProxy> find(const alerts::AgentAddress& agent);
 
   sdbus::IConnection& connection_;

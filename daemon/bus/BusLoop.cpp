@@ -37,12 +37,13 @@ BusLoop::End BusLoop::run() {
   std::array<pollfd, 3> polled{};
   while (polled[2].revents == 0) {
     runPosted();
+    sdbus::IConnection::PollData bus{};
     try {
       for (int i = 0; i < kMessagesInARow && connection_.processPendingRequest(); ++i) continue;
+      bus = connection_.getEventLoopPollData();
     } catch (const sdbus::Error&) {
       return End::kBusLost;
     }
-    const auto bus = connection_.getEventLoopPollData();
     polled = {{{bus.fd, bus.events, 0}, {wakeUp_.get(), POLLIN, 0}, {stopDescriptor_, POLLIN, 0}}};
     const int ready = ::poll(polled.data(), polled.size(), bus.getPollTimeout());
     if (ready < 0 && errno != EINTR) return End::kBusLost;

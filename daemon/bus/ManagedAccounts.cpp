@@ -60,19 +60,24 @@ void ManagementService::removeAccount(SharedCall call) {
     const std::string& accountType = account->accountType;
     const auto begun = parts_.intents.begin({records::Intent::Kind::kRemoveAccount, accountType, accountID});
     if (!begun) throwFailure(begun.failure());
-    const auto barrier = parts_.requests.makeVoid(
+    std::optional barrier(parts_.requests.makeVoid(
         requests::VoidReason::kAccountRemoved,
-        [accountType](const requests::RequestKey& key) { return key.accountType == accountType; });
+        [accountType](const requests::RequestKey& key) { return key.accountType == accountType; }));
     const auto clientIDs = clientsWithRecord(accountType);
     pluginForAccountType(parts_, accountType)
         .revokeAllAccessToAccountsOfType(std::make_shared<const RVAccountType>(accountType),
                                          makeStore(parts_),
                                          [](bool, const std::optional<RVError>&) {});
-    if (const auto removed = parts_.accounts.remove(accountID); !removed) throwFailure(removed.failure());
-    if (const auto finished = parts_.intents.finish(*begun); !finished)
-      logging::error(parts_.log,
-                     "An account was removed, but its removal stays noted as begun: %@",
-                     {finished.failure().message});
+    // A record that outlived the account would be a grant for the next one.
+    const bool isRevoked = parts_.records.list(accountType).empty();
+    const auto removed =
+        isRevoked
+            ? parts_.accounts.remove(accountID)
+            : base::Failure{base::FailureKind::kFailed,
+                            "Its clients' access could not be revoked, so the account stays; try again"};
+    finish(*begun);
+    if (!removed) throwFailure(removed.failure());
+    barrier.reset();  // whoever is answered may ask again at once
     call->reply();
     accountsService_.accessChanged(accountType, clientIDs);
     announceAccounts();

@@ -129,20 +129,26 @@ void ManagementService::revokeAccess(SharedCall call) {
   const std::string clientID = readClientID(*call);
   auto& plugin = pluginForAccountType(parts_, accountType);
   dispatcher_.onPool(call, [this, call, &plugin, accountType, clientID] {
-    const auto barrier = parts_.requests.makeVoid(
+    auto barrier = parts_.requests.makeVoid(
         requests::VoidReason::kClientRevoked,
         [accountType, clientKey = clientKeyOfID(clientID)](const requests::RequestKey& key) {
           return key.accountType == accountType && key.clientKey == clientKey;
         });
     const bool hadRecord = parts_.records.find(accountType, clientID).has_value();
-    revoke(*call,
-           {records::Intent::Kind::kRevokeClient, accountType, clientID},
-           [&](RVDAccessCompletion completion) {
-             plugin.revokeAccessToAccountsOfType(std::make_shared<const RVAccountType>(accountType),
-                                                 parts_.clients.clientForID(clientID),
-                                                 makeStore(parts_),
-                                                 std::move(completion));
-           });
+    revoke(
+        *call,
+        {records::Intent::Kind::kRevokeClient, accountType, clientID},
+        [&](RVDAccessCompletion completion) {
+          plugin.revokeAccessToAccountsOfType(std::make_shared<const RVAccountType>(accountType),
+                                              parts_.clients.clientForID(clientID),
+                                              makeStore(parts_),
+                                              std::move(completion));
+        },
+        [&] {
+          const auto record = parts_.records.find(accountType, clientID);
+          return !record || !record->granted;
+        },
+        std::move(barrier));
     if (hadRecord) accountsService_.accessChanged(accountType, {clientID});
   });
 }
@@ -152,28 +158,52 @@ void ManagementService::revokeAllAccess(SharedCall call) {
   call->message() >> accountType;
   auto& plugin = pluginForAccountType(parts_, accountType);
   dispatcher_.onPool(call, [this, call, &plugin, accountType] {
-    const auto barrier = parts_.requests.makeVoid(
+    auto barrier = parts_.requests.makeVoid(
         requests::VoidReason::kClientRevoked,
         [accountType](const requests::RequestKey& key) { return key.accountType == accountType; });
     const auto clientIDs = clientsWithRecord(accountType);
-    revoke(*call, {records::Intent::Kind::kRevokeAll, accountType, ""}, [&](RVDAccessCompletion completion) {
-      plugin.revokeAllAccessToAccountsOfType(
-          std::make_shared<const RVAccountType>(accountType), makeStore(parts_), std::move(completion));
-    });
+    revoke(
+        *call,
+        {records::Intent::Kind::kRevokeAll, accountType, ""},
+        [&](RVDAccessCompletion completion) {
+          plugin.revokeAllAccessToAccountsOfType(
+              std::make_shared<const RVAccountType>(accountType), makeStore(parts_), std::move(completion));
+        },
+        [&] { return parts_.records.list(accountType).empty(); },
+        std::move(barrier));
     accountsService_.accessChanged(accountType, clientIDs);
   });
 }
 
-// Runs the revocation under an intent, and answers the call with what it came to.
-void ManagementService::revoke(Call& call, const records::Intent& intent, const Revocation& revocation) {
+// Runs the revocation under an intent, and answers the call with what it came to. Plug-ins do not look at
+// what becomes of the records that they write, so that is looked at here: isDone. Without an account
+// plug-ins leave the records alone.
+void ManagementService::revoke(Call& call,
+                               const records::Intent& intent,
+                               const Revocation& revocation,
+                               const std::function<bool()>& isDone,
+                               std::optional<requests::RequestTable::Barrier> barrier) {
   const auto begun = parts_.intents.begin(intent);
   if (!begun) throwFailure(begun.failure());
   std::optional<std::pair<bool, std::optional<RVError>>> decision;
-  revocation([&](bool succeeded, const std::optional<RVError>& error) { decision = {succeeded, error}; });
-  if (const auto finished = parts_.intents.finish(*begun); !finished)
-    logging::error(
-        parts_.log, "A revocation was done, but stays noted as begun: %@", {finished.failure().message});
+  try {
+    revocation([&](bool succeeded, const std::optional<RVError>& error) { decision = {succeeded, error}; });
+  } catch (...) {
+    finish(*begun);
+    throw;
+  }
+  // One that failed is crossed out as well: its caller hears of it, and what is granted from then on must
+  // not be undone by the next start.
+  finish(*begun);
+  if (!parts_.accounts.listOfType(intent.accountType).empty() && !isDone())
+    throw sdbus::Error(kFailed, "The revocation could not be written down; try again");
+  barrier.reset();  // whoever is answered may ask again at once
   if (decision) answerDecision(call, decision->first, decision->second);
+}
+
+void ManagementService::finish(std::int64_t intent) {
+  if (const auto finished = parts_.intents.finish(intent); !finished)
+    logging::error(parts_.log, "What was begun stays noted as begun: %@", {finished.failure().message});
 }
 
 void ManagementService::forgetRefusal(SharedCall call) {

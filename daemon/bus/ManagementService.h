@@ -3,6 +3,7 @@
 
 #include <functional>
 #include <memory>
+#include <optional>
 #include <string>
 #include <vector>
 
@@ -41,7 +42,12 @@ class ManagementService {
   void authorizeAccess(SharedCall call);
   void revokeAccess(SharedCall call);
   void revokeAllAccess(SharedCall call);
-  void revoke(Call& call, const records::Intent& intent, const Revocation& revocation);
+  void revoke(Call& call,
+              const records::Intent& intent,
+              const Revocation& revocation,
+              const std::function<bool()>& isDone,
+              std::optional<requests::RequestTable::Barrier> barrier);
+  void finish(std::int64_t intent);
   void forgetRefusal(SharedCall call);
   void listAccessLog(SharedCall call);
   std::vector<std::string> clientsWithRecord(const std::string& accountType) const;

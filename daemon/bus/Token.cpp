@@ -1,6 +1,7 @@
 #include "daemon/bus/Token.h"
 
 #include <poll.h>
+#include <sys/uio.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -34,8 +35,11 @@ base::Result<RVSecret> readToken(int descriptor, const std::function<bool()>& ma
   for (;;) {
     if (!mayGoOn()) return base::Failure{base::FailureKind::kFailed, "The token is not wanted any more"};
     pollfd polled{descriptor, POLLIN, 0};
-    if (::poll(&polled, 1, kLookUpEvery) == 0) continue;
-    const ssize_t count = ::read(descriptor, buffer.bytes.data() + size, buffer.bytes.size() - size);
+    if (::poll(&polled, 1, kLookUpEvery) <= 0) continue;
+    // Without waiting: somebody else who holds the descriptor may have read what poll has seen.
+    const iovec room{buffer.bytes.data() + size, buffer.bytes.size() - size};
+    ssize_t count = ::preadv2(descriptor, &room, 1, -1, RWF_NOWAIT);
+    if (count < 0 && errno == EOPNOTSUPP) count = ::readv(descriptor, &room, 1);
     if (count < 0 && (errno == EINTR || errno == EAGAIN)) continue;
     if (count < 0) return invalid("The token cannot be read");
     if (count == 0) break;

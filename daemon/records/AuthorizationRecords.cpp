@@ -5,6 +5,12 @@
 #include "daemon/log/Log.h"
 
 namespace records {
+namespace {
+
+constexpr const char* kDeleteAuthorization =
+    "DELETE FROM authorizations WHERE account_type = ?1 AND client_id = ?2";
+
+}  // namespace
 
 AuthorizationRecords::AuthorizationRecords(Database& database, RVLogService& log, state::Clock clock)
     : database_(database),
@@ -16,6 +22,7 @@ base::Result<std::unique_ptr<AuthorizationRecords>> AuthorizationRecords::load(D
                                                                                RVLogService& log,
                                                                                state::Clock clock) {
   std::unique_ptr<AuthorizationRecords> records(new AuthorizationRecords(database, log, std::move(clock)));
+  if (auto removed = records->removeUnreadable(); !removed) return removed.failure();
   if (auto read = records->reload(); !read) return read.failure();
   return records;
 }
@@ -35,19 +42,37 @@ base::Result<void> AuthorizationRecords::reload() {
       if (!*row) return {};
       const std::string clientId = (*statement)->text(1);
       auto record = readAuthorization(**statement);
-      if (record) {
-        all[record->accountType].insert_or_assign(clientId, *std::move(record));
-      } else {
-        logging::error(log_,
-                       "The record of %@ cannot be read (%@); the client counts as one that never asked.",
-                       {RVValue(clientId), RVValue(record.failure().message)});
-      }
+      if (record) all[record->accountType].insert_or_assign(clientId, *std::move(record));
     }
   });
   if (!done) return done;
   const std::unique_lock lock(mutex_);
   records_ = std::move(all);
   return {};
+}
+
+base::Result<void> AuthorizationRecords::removeUnreadable() {
+  return database_.write([&](Connection& connection) -> base::Result<void> {
+    auto statement = connection.prepare(kSelectAuthorizations);
+    if (!statement) return statement.failure();
+    std::vector<std::pair<std::string, std::string>> unreadable;
+    for (;;) {
+      const auto row = (*statement)->step();
+      if (!row) return row.failure();
+      if (!*row) break;
+      const auto record = readAuthorization(**statement);
+      if (record) continue;
+      unreadable.emplace_back((*statement)->text(0), (*statement)->text(1));
+      logging::error(log_,
+                     "The record of %@ cannot be read (%@); the client counts as one that never asked.",
+                     {RVValue(unreadable.back().second), RVValue(record.failure().message)});
+    }
+    for (const auto& [accountType, clientId] : unreadable) {
+      auto removed = connection.run(kDeleteAuthorization, accountType, clientId);
+      if (!removed) return removed;
+    }
+    return {};
+  });
 }
 
 base::Result<void> AuthorizationRecords::write(const std::string& accountType,
@@ -114,8 +139,7 @@ base::Result<void> AuthorizationRecords::forgetRefusal(const std::string& accoun
         const auto record = find(accountType, clientId);
         if (!record) return base::Failure{base::FailureKind::kNotFound, "the client has no record"};
         if (record->granted) return base::Failure{base::FailureKind::kRefused, "the client holds a grant"};
-        return connection.run(
-            "DELETE FROM authorizations WHERE account_type = ?1 AND client_id = ?2", accountType, clientId);
+        return connection.run(kDeleteAuthorization, accountType, clientId);
       },
       [&](OfType& ofType) { ofType.erase(clientId); });
 }

@@ -22,8 +22,8 @@ namespace records {
 // Reads come from memory and never wait for the disk; a write is on the disk when it returns. Thread-safe.
 class AuthorizationRecords {
  public:
-  // Reads every record. One that cannot be read is left out, with an error in the log. The database and the
-  // log outlive the object.
+  // Reads every record. One that cannot be read is removed, with an error in the log, so that no credential
+  // is handed out on the strength of it. The database and the log outlive the object.
   static base::Result<std::unique_ptr<AuthorizationRecords>> load(Database& database,
                                                                   RVLogService& log,
                                                                   state::Clock clock);
@@ -50,6 +50,7 @@ class AuthorizationRecords {
 
   AuthorizationRecords(Database& database, RVLogService& log, state::Clock clock);
   base::Result<void> reload();
+  base::Result<void> removeUnreadable();
   // Runs the work and, where it succeeded, lets memory follow.
   base::Result<void> write(const std::string& accountType,
                            const Database::Work& work,

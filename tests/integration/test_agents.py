@@ -99,6 +99,14 @@ def test_an_alert_whose_only_agent_goes_waits_for_another(asking):
     assert pending.answer() == GRANTED
 
 
+def test_an_alert_is_taken_down_where_its_agent_unregisters(asking):
+    agent = asking.agent()
+    asking.application().start_request(["email"])
+    alert = agent.next()
+    agent.unregister()
+    alert.wait_until_dismissed()
+
+
 def test_a_late_answer_of_an_agent_that_unregistered_counts_for_nothing(asking):
     agent = asking.agent()
     application = asking.application()

@@ -118,9 +118,14 @@ TEST_F(ADamagedDatabase, WhoseRefusalWasMadeAGrantIsNotBelieved) {
     auto connection = support::valueOf(records::Connection::open(path_ + "/accounts.db"));
     support::succeed(connection.execute("UPDATE authorizations SET granted = 1"));
   }
-  const support::StoredState state(path_);
-  EXPECT_EQ(state.records->list(kType).size(), 10U);  // those that were granted before
-  EXPECT_EQ(state.log.lines().size(), 10U);
+  {
+    const support::StoredState state(path_);
+    EXPECT_EQ(state.records->list(kType).size(), 10U);  // those that were granted before
+    EXPECT_EQ(state.log.lines().size(), 10U);
+  }
+  const support::StoredState again(path_);
+  EXPECT_EQ(again.records->list(kType).size(), 10U);
+  EXPECT_TRUE(again.log.lines().empty()) << "what cannot be believed is gone for good";
 }
 
 }  // namespace
