@@ -18,7 +18,8 @@ class RequestLog {
   // be written.
   explicit RequestLog(const std::string& path);
 
-  // Returns once the line has been handed to the system. status: 0 where the connection was dropped without one.
+  // Returns once the line has been handed to the system. status: 0 where the connection was dropped without
+  // one.
   void write(const std::string& method,
              const std::string& path,
              const Question& question,

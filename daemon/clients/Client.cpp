@@ -33,7 +33,7 @@ bool Client::hasEntitlement(std::string_view entitlement) const {
 }
 
 std::string Client::description() const {
-  return id_.value_or("a client without an ID");
+  return id_.value_or("(no ID)");
 }
 
 ClientDirectory::ClientDirectory(const InstalledApplications& applications,

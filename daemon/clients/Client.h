@@ -35,7 +35,7 @@ class Client final : public RVDClient {
   std::optional<std::string> bundleID() const override;
   std::string localizedAppName() const override;
   bool hasEntitlement(std::string_view entitlement) const override;
-  // The ID, or "a client without an ID".
+  // The ID, or "(no ID)".
   std::string description() const override;
 
   // A name or a path; empty where the application has none.

@@ -56,7 +56,7 @@ TEST_F(TheClientDirectory, KnowsAClientThatNothingIsKnownAbout) {
   const auto client = directory_.unknownClient();
   EXPECT_EQ(client->bundleID(), std::nullopt);
   EXPECT_EQ(client->localizedAppName(), "Eine unbekannte Anwendung");
-  EXPECT_EQ(client->description(), "a client without an ID");
+  EXPECT_EQ(client->description(), "(no ID)");
   EXPECT_EQ(clients::evidenceText(client->evidence()), "unknown");
   EXPECT_FALSE(client->hasEntitlement("e"));
 }
