@@ -122,7 +122,7 @@ void TKFacebookAccountAccessPlugin::revokeAllAccessToAccountsOfType(
       kRevokeAll,
       "Found %d authorized clients. Revoking all...",
       {static_cast<std::int64_t>(authorizations.size())});
-  const auto session = services_.facebookRequests->initSession();
+  std::shared_ptr<TKFacebookSession> session = services_.facebookRequests->initSession();
   for (const RVDClientAuthorization& authorization : authorizations)
     revokeToken(kRevokeAll, authorization, *authorization.client(), *account, [&] { return session; });
   manager.removeAllClientAuthorizationsForAccountType(*accountType);

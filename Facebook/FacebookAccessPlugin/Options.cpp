@@ -22,17 +22,22 @@ const RVArray* permissionList(const RVDictionary& options) {
 
 bool TKFacebookAccountAccessPlugin::_validateOptionsDictionary(const RVDictionary& options) const {
   const RVValue* appID = RVValueForKey(options, RVFacebookAppIdKey);
-  if (appID == nullptr || appID->string() == nullptr || appID->string()->empty()) return false;
+  const bool hasAppID = appID != nullptr && appID->string() != nullptr && !appID->string()->empty();
 
   const RVArray* permissions = permissionList(options);
-  if (permissions == nullptr) return RVValueForKey(options, RVFacebookPermissionsKey) == nullptr;
+  const bool hasNothingElseForAList =
+      permissions != nullptr || RVValueForKey(options, RVFacebookPermissionsKey) == nullptr;
 
-  const bool writes = std::any_of(permissions->begin(), permissions->end(), [&](const RVValue& permission) {
-    return permission.string() != nullptr && _writePermissions().contains(*permission.string());
+  static const RVArray kNone;
+  const RVArray& requested = permissions != nullptr ? *permissions : kNone;
+  const RVPermissionSet& writePermissions = _writePermissions();
+  const bool writes = std::any_of(requested.begin(), requested.end(), [&](const RVValue& permission) {
+    return permission.string() != nullptr && writePermissions.contains(*permission.string());
   });
-  if (!writes) return true;
   const RVValue* audience = RVValueForKey(options, RVFacebookAudienceKey);
-  return audience != nullptr && audience->string() != nullptr;
+  const bool hasAudience = audience != nullptr && audience->string() != nullptr;
+
+  return hasAppID && hasNothingElseForAList && (hasAudience || !writes);
 }
 
 std::optional<std::string> TKFacebookAccountAccessPlugin::_appIDFromOptionsDictionary(
