@@ -272,6 +272,14 @@ TEST_F(ARequestAfterAGrant, ToReadKeepsItsCreditWhateverTheAudience) {
   EXPECT_TRUE(isHeld(optionsFor({"email"}, "friends")));
 }
 
+TEST_F(ARequestAfterAGrant, ToReadKeepsTheWritePermissionsHeldWhateverTheAudience) {
+  host.store->removeAccounts();
+  const auto privileged = host.makeClient("org.example.Default", {kDefaultAccess});
+  storeRecord(privileged, true, RVPermissionSet{"publish"}, keptOptions("111", "everyone"));
+  request(privileged, optionsFor({"email"}, "friends"));
+  EXPECT_EQ(record("org.example.Default")->grantedPermissions(), RVPermissionSet({"email", "publish"}));
+}
+
 TEST_F(ARequestAfterAGrant, ToWriteIsJudgedByTheAudienceEvenForAnotherAppID) {
   grant({"publish_stream"}, keptOptions("111", "friends"));
   EXPECT_FALSE(isHeld(optionsFor({"publish_stream"}, "friends", "222")));
