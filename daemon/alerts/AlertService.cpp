@@ -211,7 +211,7 @@ std::shared_ptr<AlertService::Showing> AlertService::show(Lock& lock,
                                                           Alert& alert,
                                                           const AgentAddress& agent) {
   // A new name each time, so that a late answer to an earlier attempt is an answer to nothing.
-  const auto showing = std::make_shared<Showing>(Showing{agent, newIdentifier_(), false, std::nullopt});
+  auto showing = std::make_shared<Showing>(Showing{agent, newIdentifier_(), false, std::nullopt});
   alert.showing = showing;
   lock.unlock();
   // The alert may be gone when a late answer comes; the attempt says whether it still counts.
