@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <limits>
 #include <optional>
+#include <utility>
 
 #include "daemon/bus/Values.h"
 #include "interfaces/Agent1Methods.h"
@@ -78,7 +79,7 @@ void AgentConnections::showAlert(const alerts::AgentAddress& agent,
   call << alertID;
   writeDictionary(call, description);
   constexpr auto kNoTimeout = std::numeric_limits<std::uint64_t>::max();
-  proxy->callMethod(
+  auto pending = proxy->callMethod(
       call,
       [answered = std::move(answered), name = agent.name](sdbus::MethodReply& reply,
                                                           const sdbus::Error* error) {
@@ -87,6 +88,8 @@ void AgentConnections::showAlert(const alerts::AgentAddress& agent,
         answered(isAnswer ? responseFlags(reply) : std::nullopt);
       },
       kNoTimeout);
+  // Let go of where the answer arrives, which lets go of it as well.
+  loop_.post([held = std::move(pending)] {});
   loop_.sendRest();
 }
 
