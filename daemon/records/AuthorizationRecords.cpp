@@ -40,9 +40,8 @@ base::Result<void> AuthorizationRecords::reload() {
       const auto row = (*statement)->step();
       if (!row) return row.failure();
       if (!*row) return {};
-      const std::string clientId = (*statement)->text(1);
       auto record = readAuthorization(**statement);
-      if (record) all[record->accountType].insert_or_assign(clientId, *std::move(record));
+      if (record) all[(*statement)->text(0)].insert_or_assign((*statement)->text(1), *std::move(record));
     }
   });
   if (!done) return done;
