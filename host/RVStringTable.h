@@ -15,9 +15,9 @@ class RVStringTable {
 
   // The table's text for the key. Where no table of the language chain has the key: `value`, or where
   // that is empty, the key itself. Absent only when a host cannot look anything up at all.
-  virtual std::optional<std::string> localizedStringForKey(std::string_view key,
-                                                           std::string_view value,
-                                                           std::string_view table) = 0;
+  virtual std::optional<std::string> textForKey(std::string_view key,
+                                                std::string_view value,
+                                                std::string_view table) = 0;
 
   // Fills a format: "%@" and "%d" take the arguments in order, "%1$@" names one by its position, "%%" is a
   // percent sign. An argument is put in as it is and never scanned for placeholders; an absent one

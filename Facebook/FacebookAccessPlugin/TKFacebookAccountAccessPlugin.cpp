@@ -107,7 +107,7 @@ RVError TKFacebookAccountAccessPlugin::accessError(int code,
 }
 
 std::optional<std::string> TKFacebookAccountAccessPlugin::localized(std::string_view key) const {
-  return services_.stringTable->localizedStringForKey(key, "", kStringTable);
+  return services_.stringTable->textForKey(key, "", kStringTable);
 }
 
 std::string TKFacebookAccountAccessPlugin::localizedFormat(std::string_view key,

@@ -1,18 +1,19 @@
 // The names under which the daemon is found, and those of the errors that it answers with.
 #pragma once
 
+#include "base/BusNames.h"
+
 namespace bus {
 
-inline constexpr const char* kServiceName = "com.zentor.rvd";
-inline constexpr const char* kObjectPath = "/com/zentor/rvd";
-
-inline constexpr const char* kAccessDenied = "org.freedesktop.DBus.Error.AccessDenied";
-inline constexpr const char* kInvalidArgs = "org.freedesktop.DBus.Error.InvalidArgs";
-inline constexpr const char* kUnsupportedAccountType = "com.zentor.rvd.Error.UnsupportedAccountType";
-inline constexpr const char* kUnknownApplication = "com.zentor.rvd.Error.UnknownApplication";
-inline constexpr const char* kAlreadyIdentified = "com.zentor.rvd.Error.AlreadyIdentified";
-inline constexpr const char* kNoAccess = "com.zentor.rvd.Error.NoAccess";
-inline constexpr const char* kLimitsExceeded = "com.zentor.rvd.Error.LimitsExceeded";
-inline constexpr const char* kFailed = "com.zentor.rvd.Error.Failed";
+using base::kAccessDenied;
+using base::kAlreadyIdentified;
+using base::kFailed;
+using base::kInvalidArgs;
+using base::kLimitsExceeded;
+using base::kNoAccess;
+using base::kObjectPath;
+using base::kServiceName;
+using base::kUnknownApplication;
+using base::kUnsupportedAccountType;
 
 }  // namespace bus

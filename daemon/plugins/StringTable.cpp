@@ -48,9 +48,9 @@ StringTable::StringTable(const std::string& resources,
   }
 }
 
-std::optional<std::string> StringTable::localizedStringForKey(std::string_view key,
-                                                              std::string_view value,
-                                                              std::string_view table) {
+std::optional<std::string> StringTable::textForKey(std::string_view key,
+                                                   std::string_view value,
+                                                   std::string_view table) {
   const std::string fallback(value.empty() ? key : value);
   const auto texts = tables_.find(table);
   if (texts == tables_.end()) return fallback;

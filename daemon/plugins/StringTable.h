@@ -20,9 +20,9 @@ class StringTable final : public RVStringTable {
   // languages: see base::languageChain.
   StringTable(const std::string& resources, const std::vector<std::string>& languages, RVLogService& log);
 
-  std::optional<std::string> localizedStringForKey(std::string_view key,
-                                                   std::string_view value,
-                                                   std::string_view table) override;
+  std::optional<std::string> textForKey(std::string_view key,
+                                        std::string_view value,
+                                        std::string_view table) override;
   std::string stringWithFormat(std::string_view format,
                                const std::vector<std::optional<RVValue>>& arguments) const override;
 

@@ -47,20 +47,20 @@ INSTANTIATE_TEST_SUITE_P(OfBothKinds,
                          [](const auto& kind) { return kind.param.name; });
 
 TEST_P(EveryStringTable, HasItsTextsByTheirKeys) {
-  EXPECT_EQ(table_->localizedStringForKey("ALLOW", "", kTable), "Erlauben");
-  EXPECT_EQ(table_->localizedStringForKey("ALLOW", "default", kTable), "Erlauben");
-  EXPECT_EQ(table_->localizedStringForKey("ÜBER %@", "", kTable), "über");
+  EXPECT_EQ(table_->textForKey("ALLOW", "", kTable), "Erlauben");
+  EXPECT_EQ(table_->textForKey("ALLOW", "default", kTable), "Erlauben");
+  EXPECT_EQ(table_->textForKey("ÜBER %@", "", kTable), "über");
 }
 
 TEST_P(EveryStringTable, ShowsAMissingEntryAsTheDefaultOrAsItsKey) {
-  EXPECT_EQ(table_->localizedStringForKey("NONE", "default", kTable), "default");
-  EXPECT_EQ(table_->localizedStringForKey("NONE", "", kTable), "NONE");
-  EXPECT_EQ(table_->localizedStringForKey("allow", "", kTable), "allow");
-  EXPECT_EQ(table_->localizedStringForKey("", "", kTable), "");
+  EXPECT_EQ(table_->textForKey("NONE", "default", kTable), "default");
+  EXPECT_EQ(table_->textForKey("NONE", "", kTable), "NONE");
+  EXPECT_EQ(table_->textForKey("allow", "", kTable), "allow");
+  EXPECT_EQ(table_->textForKey("", "", kTable), "");
 }
 
 TEST_P(EveryStringTable, FillsFormatsWithoutScanningTheArguments) {
-  const auto format = table_->localizedStringForKey("FORMAT", "", kTable);
+  const auto format = table_->textForKey("FORMAT", "", kTable);
   ASSERT_TRUE(format);
   EXPECT_EQ(table_->stringWithFormat(*format, {"%2$@", "b"}), "b %2$@");
   EXPECT_EQ(table_->stringWithFormat("%@ %d%% %@ %@", {"a", 5, std::nullopt}), "a 5% (null) (null)");

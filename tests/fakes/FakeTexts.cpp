@@ -10,10 +10,10 @@ FakeStringTable::FakeStringTable()
     : Fake("stringTable") {
 }
 
-std::optional<std::string> FakeStringTable::localizedStringForKey(std::string_view key,
-                                                                  std::string_view value,
-                                                                  std::string_view table) {
-  begin("localizedStringForKey");
+std::optional<std::string> FakeStringTable::textForKey(std::string_view key,
+                                                       std::string_view value,
+                                                       std::string_view table) {
+  begin("textForKey");
   const std::lock_guard lock(mutex_);
   lookups_.push_back({std::string(key), std::string(value), std::string(table)});
   if (unavailable_) return std::nullopt;

@@ -27,9 +27,9 @@ class FakeStringTable final : public RVStringTable, public Fake {
 
   FakeStringTable();
 
-  std::optional<std::string> localizedStringForKey(std::string_view key,
-                                                   std::string_view value,
-                                                   std::string_view table) override;
+  std::optional<std::string> textForKey(std::string_view key,
+                                        std::string_view value,
+                                        std::string_view table) override;
   std::string stringWithFormat(std::string_view format,
                                const std::vector<std::optional<RVValue>>& arguments) const override;
 

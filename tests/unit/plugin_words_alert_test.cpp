@@ -155,7 +155,7 @@ TEST_F(APrompt, DoesNotWaitForAnotherOne) {
 
 TEST_F(APrompt, PassesOnWhatAServiceThrowsAndAnswersNothing) {
   for (const std::string failing : {"client.localizedAppName",
-                                    "stringTable.localizedStringForKey",
+                                    "stringTable.textForKey",
                                     "userNotifications.ZQUserNotificationCreate",
                                     "userNotifications.ZQUserNotificationReceiveResponse"}) {
     host.journal->setBeforeCall([&](std::size_t, const std::string& call) {

@@ -64,11 +64,11 @@ class TableWithGaps final : public RVStringTable {
       : table_(table),
         gaps_(std::move(gaps)) {}
 
-  std::optional<std::string> localizedStringForKey(std::string_view key,
-                                                   std::string_view value,
-                                                   std::string_view table) override {
+  std::optional<std::string> textForKey(std::string_view key,
+                                        std::string_view value,
+                                        std::string_view table) override {
     if (gaps_.contains(key)) return std::nullopt;
-    return table_.localizedStringForKey(key, value, table);
+    return table_.textForKey(key, value, table);
   }
   std::string stringWithFormat(std::string_view format,
                                const std::vector<std::optional<RVValue>>& arguments) const override {

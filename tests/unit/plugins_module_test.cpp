@@ -92,7 +92,7 @@ TEST(TheFacebookBundle, IsLoadedWithItsPluginAndItsWords) {
   EXPECT_TRUE(modules[0]->supportsAccountType(std::string(RVAccountTypeIdentifierFacebook)));
   fakes::FakeLog log;
   plugins::StringTable table(BUILT_PLUGINS "/TKFacebookAccountAccessPlugin/resources", {}, log);
-  EXPECT_NE(table.localizedStringForKey("ACCOUNT_ACCESS_UNKNOWN_ADDITIONAL_FORMAT", "", "Localizable"),
+  EXPECT_NE(table.textForKey("ACCOUNT_ACCESS_UNKNOWN_ADDITIONAL_FORMAT", "", "Localizable"),
             "ACCOUNT_ACCESS_UNKNOWN_ADDITIONAL_FORMAT");
   EXPECT_TRUE(log.lines().empty());
 }

@@ -27,7 +27,7 @@ class AStringTable : public testing::Test {
                                     std::string_view key,
                                     std::string_view value = "",
                                     std::string_view table = "Localizable") {
-    return StringTable(resources_.path(), languages, log_).localizedStringForKey(key, value, table);
+    return StringTable(resources_.path(), languages, log_).textForKey(key, value, table);
   }
 
   support::TemporaryDirectory resources_;
@@ -70,15 +70,14 @@ TEST_F(AStringTable, IsLeftWithoutABrokenFileAndSaysSo) {
 }
 
 TEST_F(AStringTable, MayHaveNoFilesAtAll) {
-  EXPECT_EQ(StringTable(resources_.path("none"), {}, log_).localizedStringForKey("A", "", "Localizable"),
-            "A");
+  EXPECT_EQ(StringTable(resources_.path("none"), {}, log_).textForKey("A", "", "Localizable"), "A");
   EXPECT_TRUE(log_.lines().empty());
 }
 
 TEST_F(AStringTable, DoesNotChangeOnceItIsMade) {
   StringTable table(resources_.path(), {}, log_);
   put("Localizable/en.mo", {{"A\4", "changed"}});
-  EXPECT_EQ(table.localizedStringForKey("A", "", "Localizable"), "a in English");
+  EXPECT_EQ(table.textForKey("A", "", "Localizable"), "a in English");
 }
 
 TEST_F(AStringTable, ServesManyThreads) {
@@ -87,7 +86,7 @@ TEST_F(AStringTable, ServesManyThreads) {
   for (int i = 0; i < 4; ++i)
     threads.emplace_back([&table] {
       for (int round = 0; round < 1000; ++round) {
-        EXPECT_EQ(table.localizedStringForKey("A", "", "Localizable"), "a auf Deutsch");
+        EXPECT_EQ(table.textForKey("A", "", "Localizable"), "a auf Deutsch");
         EXPECT_EQ(table.stringWithFormat("%2$@ %1$@", {"x", "y"}), "y x");
       }
     });

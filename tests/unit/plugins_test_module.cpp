@@ -40,7 +40,7 @@ class TestPlugin final : public RVDAccountAccessPlugin {
 
  private:
   void greet(const RVDAccessCompletion& completion) {
-    const auto text = services_.stringTable->localizedStringForKey("GREETING", "", "Localizable");
+    const auto text = services_.stringTable->textForKey("GREETING", "", "Localizable");
     completion(true, RVError{*text, 0, {}});
   }
   RVDHostServices services_;
