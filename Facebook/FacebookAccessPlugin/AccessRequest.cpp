@@ -4,6 +4,7 @@
 
 #include "Facebook/FacebookAccessPlugin/Owed.h"
 #include "Facebook/FacebookAccessPlugin/TKFacebookAccountAccessPlugin.h"
+#include "Facebook/FacebookAccessPlugin/WordList.h"
 
 namespace {
 
@@ -14,10 +15,6 @@ constexpr std::string_view kHandleResponse =
     "-[TKFacebookAccountAccessPlugin "
     "_handleUserResponse:toRequestForClient:withAppID:persistentOptions:onAccount:ofType:"
     "existingPermissions:newPermissions:audience:isFirstTimeRequest:shouldSkipServer:store:completion:]";
-
-bool shareMember(const RVPermissionSet& a, const RVPermissionSet& b) {
-  return std::any_of(a.begin(), a.end(), [&](const std::string& name) { return b.contains(name); });
-}
 
 void removeAll(RVPermissionSet& from, const RVPermissionSet& names) {
   for (const std::string& name : names) from.erase(name);
@@ -106,7 +103,7 @@ RVPermissionSet TKFacebookAccountAccessPlugin::creditForRequest(
   if (!authorization.options()) return credit;
   if (_appIDFromOptionsDictionary(*authorization.options()) == appID)
     credit = authorization.grantedPermissions().value_or(RVPermissionSet());
-  if (shareMember(requestedPermissions, _writePermissions()) &&
+  if (intersects(requestedPermissions, _writePermissions()) &&
       _audienceFromOptionsDictionary(*authorization.options()) != audience)
     removeAll(credit, _writePermissions());
   return credit;

@@ -13,12 +13,6 @@ namespace {
 // Begins the permissions that read what belongs to the user's friends.
 constexpr std::string_view kFriendsPrefix = "friends_";
 
-bool intersects(const RVPermissionSet& permissions, const RVPermissionSet& others) {
-  return std::any_of(permissions.begin(), permissions.end(), [&others](const std::string& permission) {
-    return others.contains(permission);
-  });
-}
-
 void addIfPresent(RVPermissionSet& names, std::optional<std::string> name) {
   if (name) names.insert(*std::move(name));
 }

@@ -3,6 +3,7 @@
 
 #include "Facebook/FacebookAccessPlugin/Owed.h"
 #include "Facebook/FacebookAccessPlugin/TKFacebookAccountAccessPlugin.h"
+#include "Facebook/FacebookAccessPlugin/WordList.h"
 
 namespace {
 
@@ -123,10 +124,5 @@ void TKFacebookAccountAccessPlugin::_saveCredentialForClient(
 }
 
 std::string TKFacebookAccountAccessPlugin::_csvStringFromSet(const RVPermissionSet& set) const {
-  std::string joined;
-  for (const std::string& member : set) {
-    if (&member != &*set.begin()) joined += ',';
-    joined += member;
-  }
-  return joined;
+  return joined(set, ",");
 }

@@ -1,6 +1,7 @@
-// Lists of words for the user.
+// Lists of words and sets of names.
 #pragma once
 
+#include <algorithm>
 #include <string>
 #include <string_view>
 
@@ -13,4 +14,10 @@ std::string joined(const Words& words, std::string_view separator) {
     text += *word;
   }
   return text;
+}
+
+// Whether the two sets have a member in common.
+template <typename Names>
+bool intersects(const Names& names, const Names& others) {
+  return std::any_of(names.begin(), names.end(), [&](const auto& name) { return others.contains(name); });
 }
