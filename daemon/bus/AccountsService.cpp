@@ -157,12 +157,13 @@ void AccountsService::requestAccess(const std::shared_ptr<Call>& call) {
           completion(granted, error);
         });
   };
-  parts_.requests.submit(requests::RequestKey::forOptions(
-                             id ? clientKeyOfID(*id) : call->sender(), std::move(accountType), *options),
-                         {call->sender(), [call](const auto& outcome) { answerOutcome(*call, outcome); }},
-                         parts_.limits,
-                         detailsOf(*client),
-                         std::move(work));
+  parts_.requests.submit(
+      requests::RequestKey::forOptions(
+          id ? clientKeyOfID(*id) : call->sender(), client->evidence(), std::move(accountType), *options),
+      {call->sender(), [call](const auto& outcome) { answerOutcome(*call, outcome); }},
+      parts_.limits,
+      detailsOf(*client),
+      std::move(work));
 }
 
 void AccountsService::getAccess(const std::shared_ptr<Call>& call) {

@@ -22,7 +22,7 @@ void ManagementService::addAccount(SharedCall call) {
     completion(true, std::nullopt);
   };
   parts_.requests.submitAlone(
-      {call->sender(), "", {}, {}, {}},
+      {call->sender(), "", {}, {}, {}, {}},
       {call->sender(), [call](const auto&) { call->fail(kFailed, "The account was not added"); }},
       parts_.noLimits,
       std::move(work));

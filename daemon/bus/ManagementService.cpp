@@ -113,7 +113,7 @@ void ManagementService::authorizeAccess(SharedCall call) {
                                            std::move(completion));
   };
   // Goes on when the tool that asked for it leaves: its caller has no name.
-  parts_.requests.submitAlone({clientKeyOfID(clientID), accountType, {}, {}, {}},
+  parts_.requests.submitAlone({clientKeyOfID(clientID), accountType, {}, {}, {}, {}},
                               {"",
                                [this, call, accountType, clientID](const requests::Outcome& outcome) {
                                  answerOutcome(*call, outcome);

@@ -5,7 +5,17 @@
 namespace clients {
 
 std::string_view evidenceText(Evidence evidence) {
-  return evidence == Evidence::kRegistered ? "registered" : "unknown";
+  switch (evidence) {
+    case Evidence::kUnknown:
+      break;
+    case Evidence::kRegistered:
+      return "registered";
+    case Evidence::kScope:
+      return "scope";
+    case Evidence::kSandbox:
+      return "sandbox";
+  }
+  return "unknown";
 }
 
 Client::Client(std::optional<std::string> id,

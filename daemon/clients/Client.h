@@ -6,20 +6,12 @@
 #include <string>
 #include <string_view>
 
+#include "daemon/clients/Evidence.h"
 #include "daemon/clients/InstalledApplications.h"
 #include "daemon/config/Entitlements.h"
 #include "host/RVDAccountStore.h"
 
 namespace clients {
-
-// How it is known which application a client is.
-enum class Evidence {
-  kUnknown,     // it is not known
-  kRegistered,  // the connection said so, and the application is installed
-};
-
-// "unknown", "registered".
-std::string_view evidenceText(Evidence evidence);
 
 // One client at the time of one request: what policy gives it and what it is called do not change while
 // the request runs. Immutable, shared between threads.

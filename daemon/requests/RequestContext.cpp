@@ -15,10 +15,12 @@ void runOnce(std::function<void()>& callback) {
 
 RequestContext::RequestContext(std::string clientKey,
                                std::shared_ptr<WaitingLimiter> limiter,
-                               RVDictionary details)
+                               RVDictionary details,
+                               clients::Evidence evidence)
     : clientKey_(std::move(clientKey)),
       limiter_(std::move(limiter)),
-      details_(std::move(details)) {
+      details_(std::move(details)),
+      evidence_(evidence) {
 }
 
 RequestContext::~RequestContext() = default;

@@ -8,6 +8,7 @@
 #include <optional>
 #include <string>
 
+#include "daemon/clients/Evidence.h"
 #include "host/Values.h"
 
 namespace requests {
@@ -39,7 +40,10 @@ class RequestContext {
  public:
   // clientKey: tells clients apart for the limits. limiter: may be null (nothing is counted). details: see
   // clientDetails.
-  RequestContext(std::string clientKey, std::shared_ptr<WaitingLimiter> limiter, RVDictionary details = {});
+  RequestContext(std::string clientKey,
+                 std::shared_ptr<WaitingLimiter> limiter,
+                 RVDictionary details = {},
+                 clients::Evidence evidence = clients::Evidence::kUnknown);
   RequestContext(const RequestContext&) = delete;
   RequestContext& operator=(const RequestContext&) = delete;
   ~RequestContext();
@@ -48,6 +52,9 @@ class RequestContext {
 
   // What an alert tells about the client besides the plug-in's words, by the keys of Agent1's description.
   const RVDictionary& clientDetails() const { return details_; }
+
+  // How it was known, when the request came, which application its client is.
+  clients::Evidence evidence() const { return evidence_; }
 
   bool isVoid() const { return voidReason().has_value(); }
   std::optional<VoidReason> voidReason() const;
@@ -121,6 +128,7 @@ class RequestContext {
   const std::string clientKey_;
   const std::shared_ptr<WaitingLimiter> limiter_;
   const RVDictionary details_;
+  const clients::Evidence evidence_;
 
   // Locks are taken in this order: effects_, reasonMutex_; callbacksMutex_, reasonMutex_; waitingMutex_,
   // the limiter's own.

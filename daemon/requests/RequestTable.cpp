@@ -34,13 +34,15 @@ std::optional<RVValue> valueForKey(const RVDictionary& options, std::string_view
 }  // namespace
 
 RequestKey RequestKey::forOptions(std::string clientKey,
+                                  clients::Evidence evidence,
                                   std::string accountType,
                                   const RVDictionary& options) {
   RequestKey key{std::move(clientKey),
                  std::move(accountType),
                  valueForKey(options, RVFacebookAppIdKey),
                  valueForKey(options, RVFacebookPermissionsKey),
-                 valueForKey(options, RVFacebookAudienceKey)};
+                 valueForKey(options, RVFacebookAudienceKey),
+                 evidence};
   if (key.permissions) key.permissions = asSet(*key.permissions);
   return key;
 }
@@ -106,7 +108,8 @@ void RequestTable::submit(RequestKey key,
                           std::shared_ptr<WaitingLimiter> limiter,
                           RVDictionary details,
                           Work work) {
-  auto context = std::make_shared<RequestContext>(key.clientKey, std::move(limiter), std::move(details));
+  auto context =
+      std::make_shared<RequestContext>(key.clientKey, std::move(limiter), std::move(details), key.evidence);
   const auto request = std::make_shared<Request>(Request{std::move(key), true, std::move(context), {}});
   {
     const std::lock_guard lock(mutex_);

@@ -25,9 +25,14 @@ struct RequestKey {
   std::optional<RVValue> appID;
   std::optional<RVValue> permissions;  // a list is compared as a set of names
   std::optional<RVValue> audience;
+  // Two callers that are known with different certainty are not asked for together.
+  clients::Evidence evidence = clients::Evidence::kUnknown;
 
   // The request of a client, with what of its options tells requests apart.
-  static RequestKey forOptions(std::string clientKey, std::string accountType, const RVDictionary& options);
+  static RequestKey forOptions(std::string clientKey,
+                               clients::Evidence evidence,
+                               std::string accountType,
+                               const RVDictionary& options);
 
   friend bool operator==(const RequestKey&, const RequestKey&) = default;
 };

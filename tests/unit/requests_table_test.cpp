@@ -46,7 +46,7 @@ class TheTable : public testing::Test {
                 [this](const auto&) { ++endedVoid_; }}) {}
 
   static RequestKey key(const std::string& client, RVDictionary options = {}) {
-    return RequestKey::forOptions(client, "type", options);
+    return RequestKey::forOptions(client, clients::Evidence::kRegistered, "type", options);
   }
   void submit(const RequestKey& requestKey, const std::string& caller, RequestTable::Work work) {
     table_.submit(requestKey, {caller, answers_.next()}, nullptr, {}, std::move(work));
@@ -161,7 +161,8 @@ TEST_F(TheTable, KeepsRequestsThatDifferApart) {
       key("a", {{"permissions", RVArray{}}}),
       key("a", {{"permissions", RVArray{"a"}}}),
       key("a", {{"audience", "friends"}}),
-      RequestKey::forOptions("a", "other type", {}),
+      RequestKey::forOptions("a", clients::Evidence::kRegistered, "other type", {}),
+      RequestKey::forOptions("a", clients::Evidence::kSandbox, "type", {}),
   };
   for (const auto& requestKey : keys) submit(requestKey, ":1", waiting());
   waitForBegun(static_cast<int>(keys.size()));
