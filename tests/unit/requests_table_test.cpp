@@ -71,7 +71,7 @@ class TheTable : public testing::Test {
   std::atomic<int> endedVoid_ = 0;
   std::atomic<int> begun_ = 0;
   Answers answers_;
-  RequestPool pool_{8, 8, std::chrono::seconds(1)};
+  RequestPool pool_{16, 16, std::chrono::seconds(1)};
   RequestTable table_;
 };
 
