@@ -40,12 +40,15 @@ void ManagementService::addAccountWithToken(Call& call,
   if (!token) throwFailure(token.failure());
   const auto account = parts_.accounts.add(accountType, username);
   if (!account) throwFailure(account.failure());
-  if (const auto stored = parts_.keychain.setMasterCredential(account->identifier, *std::move(token));
-      !stored) {
-    // An account that cannot sign anything is of no use.
+  // No request finds the account before its token is stored: without it, it could sign nothing.
+  auto isSetUp = parts_.keychain.setMasterCredential(account->identifier, *std::move(token));
+  if (isSetUp) isSetUp = parts_.accounts.finishSetUp(account->identifier);
+  if (!isSetUp) {
     if (const auto removed = parts_.accounts.remove(account->identifier); !removed)
-      logging::error(parts_.log, "An account is left without its token: %@", {removed.failure().message});
-    throwFailure(stored.failure());
+      logging::error(parts_.log,
+                     "An account that could not be set up is left until the next start: %@",
+                     {removed.failure().message});
+    throwFailure(isSetUp.failure());
   }
   call.reply([&](sdbus::MethodReply& reply) { reply << account->identifier; });
   announceAccounts();

@@ -21,15 +21,20 @@ struct AccountRecord {
 };
 
 // Reads come from memory; a write is on the disk when it returns. Thread-safe.
+//
+// An account is there for requests, and is found and listed, from finishSetUp until it is retired or removed.
 class Accounts {
  public:
-  // Removes what an interrupted run left half set up: an account whose own credential was never stored
-  // (SealedKeychain::setMasterCredential), of which nobody was told yet. The database outlives the object.
+  // Removes the accounts whose set-up was interrupted; nobody was told of them yet. The database outlives
+  // the object.
   static base::Result<std::unique_ptr<Accounts>> load(Database& database,
                                                       state::IdentifierSource newIdentifier);
 
-  // Answers the new account. It is set up, and stays, once its own credential is stored.
+  // Begins to set up an account. A start removes it again until finishSetUp.
   base::Result<AccountRecord> add(const std::string& accountType, const std::string& username);
+
+  // The account has all that it needs. kNotFound where no such account is being set up.
+  base::Result<void> finishSetUp(const std::string& identifier);
 
   // In the order in which they were added.
   std::vector<AccountRecord> list() const;
@@ -37,8 +42,15 @@ class Accounts {
 
   std::optional<AccountRecord> find(std::string_view identifier) const;
 
-  // Removes the account and every sealed credential stored for it, in one go. kNotFound where there is no
-  // such account.
+  // Takes the account away from requests and deletes its clients' sealed credentials, but keeps its own, for
+  // what is still owed to the server. kNotFound where no such account is set up.
+  base::Result<void> retire(const std::string& identifier);
+
+  // The retired accounts, in the order in which they were added.
+  base::Result<std::vector<AccountRecord>> retired() const;
+
+  // Removes the account, also one that is being set up or retired, and every sealed credential stored for
+  // it, in one go. kNotFound where there is no such account.
   base::Result<void> remove(const std::string& identifier);
 
  private:
@@ -50,7 +62,7 @@ class Accounts {
   const state::IdentifierSource newIdentifier_;
   std::mutex writes_;  // held from before a write until memory shows it
   mutable std::mutex mutex_;
-  std::vector<AccountRecord> accounts_;  // guarded by mutex_
+  std::vector<AccountRecord> accounts_;  // those that are set up; guarded by mutex_
 };
 
 }  // namespace records

@@ -19,6 +19,7 @@ struct Row {
   std::optional<std::string> permissions;
   std::optional<std::string> options;
   std::int64_t changed = 0;
+  std::int64_t evidence = 0;
 };
 
 class Digest {
@@ -60,6 +61,8 @@ std::string digestOf(const Row& row) {
   digest.add(row.permissions);
   digest.add(row.options);
   digest.add(row.changed);
+  // Rows from before evidence was kept have a digest without it.
+  if (row.evidence != 0) digest.add(row.evidence);
   return digest.finish();
 }
 
@@ -93,16 +96,22 @@ std::optional<RVDictionary> optionsFrom(std::string_view text) {
 }  // namespace
 
 base::Result<AuthorizationRecord> readAuthorization(const Statement& row) {
-  const Row read{
-      row.text(0), row.text(1), row.number(2), row.optionalText(3), row.optionalText(4), row.number(5)};
-  if (digestOf(read) != row.blob(6))
+  const Row read{row.text(0),
+                 row.text(1),
+                 row.number(2),
+                 row.optionalText(3),
+                 row.optionalText(4),
+                 row.number(5),
+                 row.number(6)};
+  if (digestOf(read) != row.blob(7))
     return base::Failure{base::FailureKind::kDamaged, "its digest does not fit"};
   AuthorizationRecord record{read.accountType,
                              read.clientId,
                              read.granted != 0,
                              std::nullopt,
                              std::nullopt,
-                             std::chrono::sys_seconds(std::chrono::seconds(read.changed))};
+                             std::chrono::sys_seconds(std::chrono::seconds(read.changed)),
+                             static_cast<clients::Evidence>(read.evidence)};
   if (read.permissions) record.permissions = permissionsFrom(*read.permissions);
   if (read.options) record.options = optionsFrom(*read.options);
   if (record.permissions.has_value() != read.permissions.has_value() ||
@@ -117,16 +126,18 @@ base::Result<void> writeAuthorization(Connection& connection, const Authorizatio
                 record.granted ? 1 : 0,
                 textOf(record.permissions),
                 textOf(record.options),
-                record.changed.time_since_epoch().count()};
+                record.changed.time_since_epoch().count(),
+                static_cast<std::int64_t>(record.evidence)};
   return connection.run(
       "INSERT OR REPLACE INTO authorizations (account_type, client_id, granted, permissions,"
-      " options, changed, digest) VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7)",
+      " options, changed, evidence, digest) VALUES (?1, ?2, ?3, ?4, ?5, ?6, ?7, ?8)",
       row.accountType,
       row.clientId,
       row.granted,
       row.permissions,
       row.options,
       row.changed,
+      row.evidence,
       Blob{digestOf(row)});
 }
 

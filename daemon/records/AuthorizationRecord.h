@@ -6,6 +6,7 @@
 #include <string>
 
 #include "base/Result.h"
+#include "daemon/clients/Evidence.h"
 #include "daemon/records/Database.h"
 #include "host/Values.h"
 
@@ -18,13 +19,16 @@ struct AuthorizationRecord {
   std::optional<RVPermissionSet> permissions;
   std::optional<RVDictionary> options;
   std::chrono::sys_seconds changed{};
+  // How it was known, when the record was made, which application the client is. Unknown: the user made it.
+  clients::Evidence evidence = clients::Evidence::kUnknown;
 
   friend bool operator==(const AuthorizationRecord&, const AuthorizationRecord&) = default;
 };
 
 // The columns that readAuthorization takes, for a SELECT.
 inline constexpr const char* kSelectAuthorizations =
-    "SELECT account_type, client_id, granted, permissions, options, changed, digest FROM authorizations";
+    "SELECT account_type, client_id, granted, permissions, options, changed, evidence, digest FROM "
+    "authorizations";
 
 // The record of the statement's current row. kDamaged where the row's digest does not fit its content, or
 // where a text in it is no value: such a record says nothing that could be believed.

@@ -35,7 +35,7 @@ base::Result<void> makeEmpty(const state::Directory& directory) {
   {
     auto connection = Connection::open(directory.path() / kUnfinishedName);
     if (!connection) return connection.failure();
-    if (auto migrated = migrate(*connection, 0); !migrated) return migrated;
+    if (auto migrated = migrate(*connection, 0, kSchemaVersion); !migrated) return migrated;
   }
   // The journal of a database that is gone or set aside must not be rolled back into this one.
   if (auto removed = directory.removeFile(std::string(kFileName) + kJournalSuffix); !removed) return removed;
@@ -54,8 +54,9 @@ base::Result<Connection> openSound(const state::Directory& directory) {
                              " was written by a newer version of rvd; install that one, or move the file"
                              " away to begin anew"};
   if (*version < 1) return base::Failure{base::FailureKind::kDamaged, "it has no tables"};
-  if (auto migrated = migrate(*connection, *version); !migrated) return migrated.failure();
-  if (auto sound = checkSoundness(*connection); !sound) return sound.failure();
+  // First, so that a damaged database is set aside as it was found.
+  if (auto sound = checkSoundness(*connection, *version); !sound) return sound.failure();
+  if (auto migrated = migrate(*connection, *version, kSchemaVersion); !migrated) return migrated.failure();
   return connection;
 }
 

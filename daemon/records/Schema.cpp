@@ -50,6 +50,16 @@ CREATE TABLE intents (
   subject TEXT NOT NULL
 ) STRICT;
 )",
+    // To version 2. An account whose own credential was never stored was not set up; nothing told such a one
+    // from the others but that. Of the decisions that are there it is not known how their clients were known.
+    R"(
+DELETE FROM accounts WHERE NOT EXISTS (
+  SELECT 1 FROM credentials WHERE account = accounts.identifier AND client_id IS NULL
+);
+ALTER TABLE accounts ADD COLUMN state INTEGER NOT NULL DEFAULT 1 CHECK (state IN (0, 1, 2));
+ALTER TABLE authorizations ADD COLUMN evidence INTEGER NOT NULL DEFAULT 0 CHECK (evidence IN (0, 1, 2, 3));
+ALTER TABLE access_log ADD COLUMN evidence INTEGER NOT NULL DEFAULT 0 CHECK (evidence IN (0, 1, 2, 3));
+)",
 };
 
 using Tables = std::vector<std::string>;
@@ -68,10 +78,10 @@ base::Result<Tables> tables(Connection& connection) {
   }
 }
 
-base::Result<void> checkTables(Connection& connection) {
+base::Result<void> checkTables(Connection& connection, std::int64_t version) {
   auto model = Connection::open(":memory:");
   if (!model) return model.failure();
-  if (auto migrated = migrate(*model, 0); !migrated) return migrated;
+  if (auto migrated = migrate(*model, 0, version); !migrated) return migrated;
   const auto expected = tables(*model);
   const auto found = tables(connection);
   if (!expected) return expected.failure();
@@ -90,8 +100,8 @@ base::Result<std::int64_t> schemaVersion(Connection& connection) {
   return (*statement)->number(0);
 }
 
-base::Result<void> migrate(Connection& connection, std::int64_t from) {
-  for (std::int64_t version = from; version < kSchemaVersion; ++version) {
+base::Result<void> migrate(Connection& connection, std::int64_t from, std::int64_t to) {
+  for (std::int64_t version = from; version < to; ++version) {
     const std::string script = std::string("BEGIN IMMEDIATE;") + kMigrations.at(version) +
                                "PRAGMA user_version = " + std::to_string(version + 1) + ";COMMIT;";
     if (auto done = connection.execute(script); !done) return done;
@@ -99,7 +109,7 @@ base::Result<void> migrate(Connection& connection, std::int64_t from) {
   return {};
 }
 
-base::Result<void> checkSoundness(Connection& connection) {
+base::Result<void> checkSoundness(Connection& connection, std::int64_t version) {
   const base::FailureKind damaged = base::FailureKind::kDamaged;
   {
     auto statement = connection.prepare("PRAGMA integrity_check(1)");
@@ -108,7 +118,7 @@ base::Result<void> checkSoundness(Connection& connection) {
     if (!row) return row.failure();
     if ((*statement)->text(0) != "ok") return base::Failure{damaged, (*statement)->text(0)};
   }
-  if (auto checked = checkTables(connection); !checked) return checked;
+  if (auto checked = checkTables(connection, version); !checked) return checked;
   auto statement = connection.prepare("PRAGMA foreign_key_check");
   if (!statement) return statement.failure();
   const auto row = (*statement)->step();

@@ -76,7 +76,9 @@ class DaemonServices {
   ZQNotificationCenter& notifications() { return notifications_; }
 
   std::string addAccount(const std::string& accountType) {
-    return support::valueOf(state_.accounts->add(accountType, "me")).identifier;
+    const std::string id = support::valueOf(state_.accounts->add(accountType, "me")).identifier;
+    support::succeed(state_.accounts->finishSetUp(id));
+    return id;
   }
   void setMasterToken(const std::string& accountId, const std::string& token) {
     support::succeed(state_.keychain->setMasterCredential(accountId, RVSecret(token)));

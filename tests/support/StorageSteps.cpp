@@ -44,6 +44,7 @@ struct Stores {
 
   StoredState state;
   preferences::PreferencesStore preferences;
+  std::string added;
   std::int64_t intent = 0;
 };
 
@@ -71,9 +72,11 @@ const std::vector<Step>& steps() {
   static const std::vector<Step> kSteps = {
       {[](Stores&) {}, "0 accounts, 0 decisions"},
       // Of no use without its token.
-      {[](Stores& s) { valueOf(s.state.accounts->add(kType, "me")); }, "0 accounts, 0 decisions"},
-      {[](Stores& s) { succeed(s.state.keychain->setMasterCredential(s.accountId(), RVSecret("master"))); },
-       "1 accounts, master, 0 decisions"},
+      {[](Stores& s) { s.added = valueOf(s.state.accounts->add(kType, "me")).identifier; },
+       "0 accounts, 0 decisions"},
+      {[](Stores& s) { succeed(s.state.keychain->setMasterCredential(s.added, RVSecret("master"))); },
+       "0 accounts, 0 decisions"},
+      {[](Stores& s) { succeed(s.state.accounts->finishSetUp(s.added)); }, "1 accounts, master, 0 decisions"},
       {[](Stores& s) { s.state.put(kApp, false); }, "1 accounts, master, refused, 0 decisions"},
       {[](Stores& s) { succeed(s.state.records->forgetRefusal(kType, kApp)); },
        "1 accounts, master, 0 decisions"},

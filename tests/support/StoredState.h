@@ -62,6 +62,7 @@ class StoredState {
     const std::string id =
         valueOf(accounts->add(std::string(RVAccountTypeIdentifierFacebook), "me")).identifier;
     succeed(keychain->setMasterCredential(id, RVSecret(token)));
+    succeed(accounts->finishSetUp(id));
     return id;
   }
 

@@ -20,7 +20,9 @@ class ADamagedDatabase : public ::testing::Test {
     for (int i = 0; i < 20; ++i) {
       const std::string id = "org.example.App" + std::to_string(i);
       const bool granted = i % 2 == 0;
-      support::succeed(state.records->put({kType, id, granted, RVPermissionSet{"email", id}, options, {}}));
+      const auto evidence = static_cast<clients::Evidence>(i % 4);
+      support::succeed(
+          state.records->put({kType, id, granted, RVPermissionSet{"email", id}, options, {}, evidence}));
       if (granted) {
         ASSERT_FALSE(state.storeCredential(id, "token of " + id));
       }
@@ -110,6 +112,16 @@ TEST_F(ADamagedDatabase, WithAPageOfZeroesForgesNothing) {
     std::string damaged = content_;
     damaged.replace(page, 4096, 4096, '\0');
     expectNothingForged(damaged, "a page of zeroes at " + std::to_string(page));
+  }
+}
+
+TEST_F(ADamagedDatabase, WhoseEvidenceWasMadeWeakerIsNotBelieved) {
+  for (const std::string evidence : {"0", "1", "2", "3"}) {
+    auto connection = support::valueOf(records::Connection::open(path_ + "/accounts.db"));
+    support::succeed(connection.execute("UPDATE authorizations SET evidence = " + evidence));
+    for (const auto& record : support::StoredState(path_).records->list(kType))
+      EXPECT_THAT(before_, ::testing::Contains(record));
+    temporary_.write("rvd/accounts.db", content_, 0600);
   }
 }
 

@@ -102,7 +102,7 @@ TEST_F(ADatabase, ThatIsASymbolicLinkIsRefused) {
 
 TEST_F(ADatabase, OfANewerVersionIsRefusedAndLeftAlone) {
   ASSERT_TRUE(open());
-  change("PRAGMA user_version = 2");
+  change("PRAGMA user_version = " + std::to_string(records::kSchemaVersion + 1));
   const std::string before = content("accounts.db");
   const auto opened = open();
   ASSERT_FALSE(opened);
@@ -110,6 +110,49 @@ TEST_F(ADatabase, OfANewerVersionIsRefusedAndLeftAlone) {
   EXPECT_THAT(opened.failure().message, HasSubstr("newer version"));
   EXPECT_EQ(content("accounts.db"), before);
   EXPECT_FALSE(exists("accounts.db.damaged-1"));
+}
+
+// What version 1 of the tables held: a whole account and one without a token, a grant, and a decision.
+const std::string kOfVersion1 =
+    "INSERT INTO accounts VALUES (1, 'half', 'type', 'h'), (2, 'whole', 'type', 'w');"
+    "INSERT INTO credentials VALUES ('whole', NULL, x'00'), ('half', 'app', x'00');"
+    "INSERT INTO authorizations VALUES ('type', 'app', 1, '[\"email\"]', '{\"app_id\":\"1\"}', 1700000000,"
+    " x'34069a2d2fc7276a6e56229f075498e2');"
+    "INSERT INTO access_log VALUES (1, 1700000000, 'type', 'app', 1, 1);";
+
+TEST_F(ADatabase, OfAnOlderVersionKeepsWhatItHolds) {
+  write("credentials.key", std::string(32, 'k'));
+  write("accounts.db", "");
+  {
+    auto connection = support::valueOf(records::Connection::open(path_ + "/accounts.db"));
+    support::succeed(records::migrate(connection, 0, 1));
+    support::succeed(connection.execute(kOfVersion1));
+  }
+  directory_.reset();  // a directory has one user
+  for (int start = 0; start < 2; ++start) {
+    const support::StoredState state(path_);
+    EXPECT_TRUE(state.log.lines().empty());
+    const auto accounts = state.accounts->list();
+    ASSERT_EQ(accounts.size(), 1U);
+    EXPECT_EQ(accounts.at(0).username, "w");
+    const auto record = state.records->find("type", "app");
+    ASSERT_TRUE(record);
+    EXPECT_TRUE(record->granted);
+    EXPECT_TRUE(record->permissions == RVPermissionSet{"email"});
+    EXPECT_EQ(record->evidence, clients::Evidence::kUnknown);
+    EXPECT_EQ(support::valueOf(state.accessLog.newest(10)).size(), 1U);
+    EXPECT_EQ(answer(*state.database, "SELECT count(*) FROM credentials"), "1");
+  }
+}
+
+TEST_F(ADatabase, OfAnOlderVersionThatIsDamagedIsSetAsideAsItWas) {
+  write("accounts.db", "");
+  {
+    auto connection = support::valueOf(records::Connection::open(path_ + "/accounts.db"));
+    support::succeed(records::migrate(connection, 0, 1));
+    support::succeed(connection.execute("CREATE TABLE another (x)"));
+  }
+  expectSetAside(content("accounts.db"));
 }
 
 TEST_F(ADatabase, ThatIsNoDatabaseIsSetAside) {
@@ -201,7 +244,7 @@ TEST_F(ADatabase, KeepsEmptyTextsAndNothingApart) {
   const auto database = support::valueOf(open());
   using std::string_literals::operator""s;
   support::succeed(database->write([&](records::Connection& connection) {
-    return connection.run("INSERT INTO access_log VALUES (1, 0, ?1, ?2, 0, 0), (2, 0, ?3, ?4, 0, 0)",
+    return connection.run("INSERT INTO access_log VALUES (1, 0, ?1, ?2, 0, 0, 0), (2, 0, ?3, ?4, 0, 0, 0)",
                           std::string_view(),
                           std::optional<std::string>(),
                           "a\0b\xff"s,

@@ -57,7 +57,8 @@ TEST_F(StoredRecords, SurviveReopening) {
       true,
       RVPermissionSet{"email", "\xfe"s, ""},
       RVDictionary{{"app_id", "1\0\xff"s}, {"\xed\xa0\x80", RVArray{1, 1.0, true, RVValue()}}},
-      {}};
+      {},
+      clients::Evidence::kScope};
   succeed(state_->records->put(written));
   state_->put("refused", false);
   const auto before = state_->records->list(kType);
@@ -68,6 +69,7 @@ TEST_F(StoredRecords, SurviveReopening) {
   EXPECT_EQ(read->changed, support::StoredState::clock());
   EXPECT_TRUE(read->permissions == written.permissions);
   EXPECT_TRUE(read->options == written.options);
+  EXPECT_EQ(read->evidence, clients::Evidence::kScope);
   EXPECT_TRUE(state_->log.lines().empty());
 }
 
@@ -183,16 +185,61 @@ class StoredAccounts : public StoredRecords {
   std::string add(const std::string& type, const std::string& username) {
     const std::string id = valueOf(state_->accounts->add(type, username)).identifier;
     succeed(state_->keychain->setMasterCredential(id, RVSecret("master")));
+    succeed(state_->accounts->finishSetUp(id));
     return id;
   }
 };
 
 TEST_F(StoredAccounts, ThatWereNotSetUpToTheEndAreGoneAtTheNextStart) {
   const std::string whole = add(kType, "whole");
-  valueOf(state_->accounts->add(kType, "half"));
+  const std::string half = valueOf(state_->accounts->add(kType, "half")).identifier;
+  succeed(state_->keychain->setMasterCredential(half, RVSecret("a token makes it no whole one")));
   reopen();
   ASSERT_EQ(state_->accounts->list().size(), 1U);
   EXPECT_EQ(state_->accounts->list().at(0).identifier, whole);
+  EXPECT_FALSE(isOnDisk(half));
+}
+
+TEST_F(StoredAccounts, AreNotThereBeforeTheyAreSetUp) {
+  const std::string id = valueOf(state_->accounts->add(kType, "me")).identifier;
+  EXPECT_THAT(state_->accounts->list(), IsEmpty());
+  EXPECT_THAT(state_->accounts->listOfType(kType), IsEmpty());
+  EXPECT_FALSE(state_->accounts->find(id));
+  EXPECT_EQ(state_->accounts->retire(id).failure().kind, base::FailureKind::kNotFound);
+  succeed(state_->accounts->finishSetUp(id));
+  EXPECT_TRUE(state_->accounts->find(id));
+  EXPECT_EQ(state_->accounts->finishSetUp(id).failure().kind, base::FailureKind::kNotFound);
+}
+
+TEST_F(StoredAccounts, ThatAreBeingSetUpCanBeRemoved) {
+  const std::string id = valueOf(state_->accounts->add(kType, "me")).identifier;
+  succeed(state_->accounts->remove(id));
+  EXPECT_EQ(state_->accounts->finishSetUp(id).failure().kind, base::FailureKind::kNotFound);
+}
+
+TEST_F(StoredAccounts, ThatAreRetiredKeepTheirOwnCredentialAlone) {
+  const std::string id = state_->addAccount("master");
+  const auto carrier = state_->account();
+  ASSERT_FALSE(state_->storeCredential("app", "token"));
+  state_->put("app", true);
+  succeed(state_->accounts->retire(id));
+  for (int round = 0; round < 2; ++round) {
+    EXPECT_THAT(state_->accounts->list(), IsEmpty());
+    EXPECT_FALSE(state_->accounts->find(id));
+    const auto retired = valueOf(state_->accounts->retired());
+    ASSERT_EQ(retired.size(), 1U);
+    EXPECT_EQ(retired.at(0).identifier, id);
+    EXPECT_EQ(retired.at(0).accountType, kType);
+    EXPECT_EQ(state_->keychain->credentialForAccount(*carrier, std::nullopt)->oauthToken().reveal(),
+              "master");
+    EXPECT_EQ(state_->keychain->credentialForClient(id, "app"), nullptr);
+    reopen();
+  }
+  EXPECT_EQ(state_->accounts->retire(id).failure().kind, base::FailureKind::kNotFound);
+  EXPECT_EQ(state_->accounts->finishSetUp(id).failure().kind, base::FailureKind::kNotFound);
+  succeed(state_->accounts->remove(id));
+  EXPECT_THAT(valueOf(state_->accounts->retired()), IsEmpty());
+  EXPECT_FALSE(isOnDisk(id));
 }
 
 TEST_F(StoredAccounts, StayWhereTheKeyOfTheirCredentialsIsLost) {
@@ -262,7 +309,7 @@ TEST_F(TheStoredAccessLog, KeepsNoMoreThanItsLimit) {
   succeed(state_->database->write([](records::Connection& connection) {
     return connection.run(
         "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < ?1) "
-        "INSERT INTO access_log SELECT i, 0, 't', NULL, 0, 0 FROM n",
+        "INSERT INTO access_log SELECT i, 0, 't', NULL, 0, 0, 0 FROM n",
         records::kAccessLogEntries);
   }));
   for (int i = 0; i < 3; ++i) state_->accessLog.RVDLogAccessRequest(kType, "new", true, true, 0);
