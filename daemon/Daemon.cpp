@@ -17,7 +17,8 @@
 #include "daemon/bus/ManagementService.h"
 #include "daemon/bus/Names.h"
 #include "daemon/bus/Senders.h"
-#include "daemon/credentials/SealedKeychain.h"
+#include "daemon/credentials/Keychain.h"
+#include "daemon/credentials/SealedStore.h"
 #include "daemon/http/FacebookRequests.h"
 #include "daemon/http/JSONReader.h"
 #include "daemon/http/TransferThread.h"
@@ -81,7 +82,8 @@ struct Daemon::Storage {
   std::unique_ptr<records::AuthorizationRecords> records;
   std::unique_ptr<records::AccessLog> accessLog;
   std::unique_ptr<records::Intents> intents;
-  std::unique_ptr<credentials::SealedKeychain> keychain;
+  std::unique_ptr<credentials::CredentialStore> credentialStore;
+  std::unique_ptr<credentials::Keychain> keychain;
   std::unique_ptr<preferences::PreferencesStore> preferences;
 };
 
@@ -191,11 +193,11 @@ base::Result<void> Daemon::openStorage(const Places& places) {
     return kept;
   if (auto kept = keep(storage.records, AuthorizationRecords::load(database, log_, state::systemTime)); !kept)
     return kept;
-  if (auto kept =
-          keep(storage.keychain,
-               credentials::SealedKeychain::open(database, *storage.directory, places.sealingKey, log_));
+  if (auto kept = keep(storage.credentialStore,
+                       credentials::SealedStore::open(database, *storage.directory, places.sealingKey, log_));
       !kept)
     return kept;
+  storage.keychain = std::make_unique<credentials::Keychain>(database, *storage.credentialStore, log_);
   storage.accessLog = std::make_unique<records::AccessLog>(database, log_, state::systemTime);
   storage.intents = std::make_unique<records::Intents>(database);
   storage.preferences = std::make_unique<preferences::PreferencesStore>(*storage.directory, log_);

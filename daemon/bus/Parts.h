@@ -9,7 +9,7 @@
 #include "daemon/clients/Client.h"
 #include "daemon/clients/Identities.h"
 #include "daemon/config/Settings.h"
-#include "daemon/credentials/SealedKeychain.h"
+#include "daemon/credentials/Keychain.h"
 #include "daemon/plugins/PluginModule.h"
 #include "daemon/preferences/NotificationCenter.h"
 #include "daemon/preferences/PreferencesStore.h"
@@ -33,7 +33,7 @@ struct Parts {
   records::AuthorizationRecords& records;
   records::AccessLog& accessLog;
   records::Intents& intents;
-  credentials::SealedKeychain& keychain;
+  credentials::Keychain& keychain;
   preferences::PreferencesStore& preferences;
   preferences::NotificationCenter& notifications;
   clients::Identities& identities;

@@ -11,7 +11,8 @@
 #include <string>
 #include <utility>
 
-#include "daemon/credentials/SealedKeychain.h"
+#include "daemon/credentials/Keychain.h"
+#include "daemon/credentials/SealedStore.h"
 #include "daemon/records/AccessLog.h"
 #include "daemon/records/Accounts.h"
 #include "daemon/records/AuthorizationRecords.h"
@@ -51,7 +52,8 @@ class StoredState {
         records(valueOf(records::AuthorizationRecords::load(*database, log, clock))),
         accessLog(*database, log, clock),
         intents(*database),
-        keychain(valueOf(credentials::SealedKeychain::open(*database, *directory, std::nullopt, log))) {}
+        credentialStore(valueOf(credentials::SealedStore::open(*database, *directory, std::nullopt, log))),
+        keychain(std::make_unique<credentials::Keychain>(*database, *credentialStore, log)) {}
 
   std::shared_ptr<records::RequestStore> storeFor(std::shared_ptr<requests::RequestContext> request) {
     return std::make_shared<records::RequestStore>(*records, *accounts, std::move(request), client, log);
@@ -100,7 +102,8 @@ class StoredState {
   std::unique_ptr<records::AuthorizationRecords> records;
   records::AccessLog accessLog;
   records::Intents intents;
-  std::unique_ptr<credentials::SealedKeychain> keychain;
+  std::unique_ptr<credentials::CredentialStore> credentialStore;
+  std::unique_ptr<credentials::Keychain> keychain;
 };
 
 inline std::shared_ptr<requests::RequestContext> newRequest() {

@@ -88,7 +88,7 @@ TEST_F(ASealedKeychain, OpensNoCredentialInThePlaceOfAnother) {
       "WHERE client_id = 'one'");
   EXPECT_EQ(token("one"), "(absent)");
   EXPECT_EQ(token("two"), "2");
-  EXPECT_THAT(state_->log.texts(), Contains(HasSubstr("of the client one, cannot be opened")));
+  EXPECT_THAT(state_->log.texts(), Contains(HasSubstr("of the client one, cannot be read")));
   change(
       "UPDATE credentials SET sealed = (SELECT c.sealed FROM credentials c WHERE c.client_id IS NULL) "
       "WHERE client_id = 'one'");

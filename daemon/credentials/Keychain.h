@@ -1,36 +1,28 @@
-// Credentials, each sealed by itself, in the daemon's own database.
+// Who may store, read and delete which credential.
 #pragma once
 
-#include <filesystem>
 #include <map>
 #include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
-#include <tuple>
 
 #include "base/Result.h"
-#include "daemon/credentials/SealingKey.h"
+#include "daemon/credentials/CredentialStore.h"
 #include "daemon/records/Database.h"
 #include "daemon/requests/RequestContext.h"
-#include "daemon/state/Directory.h"
 #include "host/RVDKeychainManager.h"
 #include "host/RVLog.h"
 
 namespace credentials {
 
-// docs/storage.md describes how a credential is sealed. For an account object that was handed out for a
-// request (records::Account), a request that is void has no effect: setting and removing answer an error.
-// Thread-safe.
-class SealedKeychain : public RVDKeychainManager {
+// The daemon's keychain over a store that keeps the credentials. For an account object that was handed out
+// for a request (records::Account), a request that is void has no effect: setting and removing answer an
+// error. Thread-safe.
+class Keychain : public RVDKeychainManager {
  public:
-  // Reads the key (SealingKey::open). Where credentials are stored but their key is gone, an error goes to
-  // the log; they count as absent from then on. The database and the log outlive the keychain.
-  static base::Result<std::unique_ptr<SealedKeychain>> open(
-      records::Database& database,
-      const state::Directory& directory,
-      const std::optional<std::filesystem::path>& handedInKey,
-      RVLogService& log);
+  // The database, which holds the accounts and records, the store and the log outlive the keychain.
+  Keychain(records::Database& database, CredentialStore& store, RVLogService& log);
 
   std::shared_ptr<const RVAccountCredential> credentialForAccount(
       const RVAccount& account,
@@ -49,8 +41,11 @@ class SealedKeychain : public RVDKeychainManager {
   std::shared_ptr<const RVAccountCredential> credentialForClient(const std::string& accountId,
                                                                  const std::string& clientId);
 
+  // Deletes every credential of the account, its own included. Called once the account is gone.
+  base::Result<void> eraseAccount(const std::string& accountId);
+
   // At start, before anybody is served: deletes every client's credential for which no granted record
-  // stands, with a log line for each.
+  // stands, and what is stored for an account that is not there, with a log line for each.
   base::Result<void> reconcile();
 
   // When a request that is void has come to its end: deletes what it stored before it became void, unless a
@@ -58,23 +53,21 @@ class SealedKeychain : public RVDKeychainManager {
   void requestEnded(const std::shared_ptr<requests::RequestContext>& request);
 
  private:
-  struct Place {
-    std::string accountId;
-    std::optional<std::string> clientId;
-    friend bool operator<(const Place& a, const Place& b) {
-      return std::tie(a.accountId, a.clientId) < std::tie(b.accountId, b.clientId);
-    }
+  // What the records say about a place.
+  struct Standing {
+    bool isOfAnAccount = false;  // the account is there
+    bool isGranted = false;      // a client's, and a granted record stands for it
   };
 
-  SealedKeychain(records::Database& database, SealingKey key, RVLogService& log);
+  base::Result<Standing> standing(const Place& place);
+  bool isGranted(const Place& place);
+  std::shared_ptr<const RVAccountCredential> read(const Place& place);
   base::Result<void> store(const Place& place, const RVAccountCredential& credential);
-  base::Result<void> remove(const Place& place);
-  std::shared_ptr<const RVAccountCredential> read(const Place& place, bool onlyGranted);
 
   records::Database& database_;
-  const SealingKey key_;
+  CredentialStore& store_;
   RVLogService& log_;
-  std::mutex mutex_;
+  std::mutex mutex_;                                                  // held while the store is changed
   std::map<Place, std::weak_ptr<requests::RequestContext>> writers_;  // who wrote last; guarded by mutex_
 };
 
