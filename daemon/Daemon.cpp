@@ -128,7 +128,10 @@ struct Daemon::Work {
               {[&log](const std::string& reason) {
                  logging::error(log, "A plug-in's call failed: %@", {reason});
                },
-               [&storage](const auto& request) { storage.keychain->requestEnded(request); }}) {}
+               [this, &storage](const auto& request) {
+                 if (request->isVoid()) storage.keychain->requestEnded(request);
+                 alerts.requestEnded(request);
+               }}) {}
 
   preferences::NotificationCenter notifications;
   preferences::SerialQueues queues;

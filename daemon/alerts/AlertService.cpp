@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <exception>
 #include <utility>
+#include <vector>
 
 #include "host/Constants.h"
 
@@ -38,6 +39,7 @@ struct AlertService::Alert {
   requests::RequestContext::Registration registration;
 
   // Protected by the service's lock.
+  std::uint64_t turn = 0;
   std::condition_variable changed;
   std::optional<ZQResponseFlags> ended;
   std::shared_ptr<Showing> showing;
@@ -67,7 +69,7 @@ void AlertService::registerAgent(const AgentAddress& agent, AgentKind kind) {
     known_.erase(known);
   }
   known_.push_back(std::move(registered));
-  wakeFirst();
+  wakeNext();
 }
 
 bool AlertService::unregisterAgent(const AgentAddress& agent) {
@@ -88,11 +90,14 @@ void AlertService::removeAgents(const std::function<bool(const Agent&)>& which) 
       ++agent;
       continue;
     }
-    Showing* showing = waiting_.empty() ? nullptr : waiting_.front()->showing.get();
-    if (showing != nullptr && showing->agent == agent->address) showing->hasEnded = true;
+    Showing* showing = shown_ == nullptr ? nullptr : shown_->showing.get();
+    if (showing != nullptr && showing->agent == agent->address) {
+      showing->hasEnded = true;
+      shown_->changed.notify_all();
+    }
     agent = known_.erase(agent);
   }
-  wakeFirst();
+  wakeNext();
 }
 
 // The best agent that is not paused; where there is none, nextTry is when the first pause ends.
@@ -116,8 +121,49 @@ void AlertService::agentFailed(const AgentAddress& address) {
   }
 }
 
-void AlertService::wakeFirst() {
-  if (!waiting_.empty()) waiting_.front()->changed.notify_all();
+// The alert whose turn it is; null where none can be shown now.
+AlertService::Alert* AlertService::next() const {
+  if (shown_ != nullptr) return nullptr;
+  Alert* first = nullptr;
+  for (Alert* alert : waiting_) {
+    if (alert->ended || (first != nullptr && first->turn <= alert->turn)) continue;
+    if (const auto& context = alert->context) {
+      const auto answered = answered_.find(context->clientKey());
+      if (context->isOutdated() || (answered != answered_.end() && !answered->second.expired())) continue;
+    }
+    first = alert;
+  }
+  return first;
+}
+
+void AlertService::wakeNext() {
+  if (Alert* alert = next()) alert->changed.notify_all();
+}
+
+// Has the alert wait for its turn.
+void AlertService::join(Lock& lock, Alert& alert) {
+  const bool isKnown = alert.context != nullptr && alert.context->evidence() != clients::Evidence::kUnknown;
+  alert.turn = turns_.join(isKnown ? alert.context->clientKey() : "");
+  waiting_.push_back(&alert);
+  if (alert.context == nullptr || !alert.context->isOutdated()) return;
+  lock.unlock();
+  alert.context->beginVoid(requests::VoidReason::kOutdated);
+  lock.lock();
+}
+
+void AlertService::requestEnded(const std::shared_ptr<requests::RequestContext>& request) {
+  std::vector<std::shared_ptr<requests::RequestContext>> outdated;
+  {
+    const std::lock_guard lock(mutex_);
+    const auto entry = answered_.find(request->clientKey());
+    if (entry != answered_.end() && (entry->second.expired() || entry->second.lock() == request))
+      answered_.erase(entry);
+    for (const Alert* alert : waiting_)
+      if (!alert->ended && alert->context != nullptr && alert->context->isOutdated())
+        outdated.push_back(alert->context);
+    wakeNext();
+  }
+  for (const auto& context : outdated) context->beginVoid(requests::VoidReason::kOutdated);
 }
 
 ZQUserNotificationRef AlertService::ZQUserNotificationCreate(const ZQAllocator*,
@@ -158,7 +204,7 @@ int AlertService::ZQUserNotificationReceiveResponse(ZQUserNotificationRef notifi
   Alert& alert = *reinterpret_cast<Alert*>(notification);
   const Time deadline = std::min(deadlineAfter(timeout), alert.deadline);
   Lock lock(mutex_);
-  const auto place = waiting_.insert(waiting_.end(), &alert);
+  join(lock, alert);
   AgentAddress agent;
   while (!alert.ended && waitUntilShowable(lock, alert, deadline, agent)) {
     const auto showing = show(lock, alert, agent);
@@ -177,8 +223,8 @@ int AlertService::ZQUserNotificationReceiveResponse(ZQUserNotificationRef notifi
     if (Clock::now() >= deadline) break;
   }
   if (!alert.ended && Clock::now() >= alert.deadline) end(alert, kEndedOtherwise);
-  waiting_.erase(place);
-  wakeFirst();
+  waiting_.remove(&alert);
+  wakeNext();
   if (!alert.ended) return 1;
   *responseFlags = *alert.ended;
   return 0;
@@ -192,7 +238,7 @@ bool AlertService::waitUntilShowable(Lock& lock, Alert& alert, Time deadline, Ag
     const Time now = Clock::now();
     if (now >= deadline) return false;
     std::optional<Time> nextTry;
-    if (waiting_.front() == &alert) {
+    if (next() == &alert) {
       if (const auto best = bestAgent(now, nextTry)) {
         agent = *best;
         return true;
@@ -213,6 +259,8 @@ std::shared_ptr<AlertService::Showing> AlertService::show(Lock& lock,
   // A new name each time, so that a late answer to an earlier attempt is an answer to nothing.
   auto showing = std::make_shared<Showing>(Showing{agent, newIdentifier_(), false, std::nullopt});
   alert.showing = showing;
+  shown_ = &alert;
+  turns_.reach(alert.turn);
   lock.unlock();
   // The alert may be gone when a late answer comes; the attempt says whether it still counts.
   const auto answered = [this, showing, &alert](std::optional<std::uint64_t> responseFlags) {
@@ -236,10 +284,12 @@ void AlertService::endedShowing(Alert& alert, const Showing& showing) {
   const bool agentHasFailed = showing.hasEnded && !showing.responseFlags;
   alert.showing->hasEnded = true;  // what comes now comes too late
   alert.showing = nullptr;
+  shown_ = nullptr;
   if (agentHasFailed) return agentFailed(showing.agent);
   if (!showing.responseFlags) return;
   for (Agent& agent : known_)
     if (agent.address == showing.agent) agent.failures = 0;
+  if (alert.context != nullptr) answered_.insert_or_assign(alert.context->clientKey(), alert.context);
   end(alert, static_cast<ZQResponseFlags>(*showing.responseFlags));
 }
 

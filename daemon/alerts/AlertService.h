@@ -6,11 +6,13 @@
 #include <cstdint>
 #include <functional>
 #include <list>
+#include <map>
 #include <memory>
 #include <mutex>
 #include <optional>
 #include <string>
 
+#include "daemon/alerts/Turns.h"
 #include "daemon/requests/RequestContext.h"
 #include "daemon/state/RandomIdentifier.h"
 #include "host/ZQUserNotification.h"
@@ -45,12 +47,18 @@ class AgentCaller {
   virtual void dismissAlert(const AgentAddress& agent, const std::string& alertID) = 0;
 };
 
-// Shows one alert at a time, in the order in which they came, each to the best agent there is: the newest
-// desktop agent, else the newest terminal agent. An alert without an agent waits for one; an agent that
-// fails is no answer, and the alert is shown again. The thread that waits for the answer does the work.
+// Shows one alert at a time, each to the best agent there is: the newest desktop agent, else the newest
+// terminal agent. An alert without an agent waits for one; an agent that fails is no answer, and the alert
+// is shown again. The thread that waits for the answer does the work.
+//
+// Clients take turns: whoever has many alerts waiting delays another client's by one at most. Clients that
+// nothing is known about share one turn, since they are as many as somebody makes of them. Alerts of equal
+// turn are shown in the order in which they came.
 //
 // An alert belongs to the RequestContext that is current when it is created; when that becomes void, the
-// alert is taken down and ends with 2. Without a current context it ends by itself alone. Thread-safe.
+// alert is taken down and ends with 2. Without a current context it ends by itself alone. After an answer,
+// the client's next alert is not shown before the answered request has ended (requestEnded): what it asks
+// may be settled then, and its request is made void as outdated, to be begun anew. Thread-safe.
 class AlertService final : public ZQUserNotificationService {
  public:
   // How long an agent is left alone after it has failed this many times in a row (1 or more).
@@ -69,6 +77,9 @@ class AlertService final : public ZQUserNotificationService {
   bool unregisterAgent(const AgentAddress& agent);
   // Unregisters all agents of a connection that left the bus.
   void agentsLeft(const std::string& name);
+
+  // A request has ended, and those that it outdates know it (RequestContext::isOutdated).
+  void requestEnded(const std::shared_ptr<requests::RequestContext>& request);
 
   ZQUserNotificationRef ZQUserNotificationCreate(const ZQAllocator* allocator,
                                                  double timeout,
@@ -96,7 +107,9 @@ class AlertService final : public ZQUserNotificationService {
   std::optional<AgentAddress> bestAgent(Time now, std::optional<Time>& nextTry) const;
   void removeAgents(const std::function<bool(const Agent&)>& which);
   void agentFailed(const AgentAddress& address);
-  void wakeFirst();
+  Alert* next() const;
+  void wakeNext();
+  void join(Lock& lock, Alert& alert);
   bool waitUntilShowable(Lock& lock, Alert& alert, Time deadline, AgentAddress& agent);
   std::shared_ptr<Showing> show(Lock& lock, Alert& alert, const AgentAddress& agent);
   void takeDown(const Showing& showing) noexcept;
@@ -109,7 +122,10 @@ class AlertService final : public ZQUserNotificationService {
 
   std::mutex mutex_;           // protects everything below, and what of an alert changes
   std::list<Agent> known_;     // oldest first
-  std::list<Alert*> waiting_;  // the first one is being shown, or about to be
+  std::list<Alert*> waiting_;  // in the order in which they came
+  Alert* shown_ = nullptr;     // one of them
+  Turns turns_;
+  std::map<std::string, std::weak_ptr<requests::RequestContext>> answered_;  // by client, until it has ended
 };
 
 }  // namespace alerts

@@ -74,7 +74,10 @@ std::optional<RVError> RequestStore::setAuthorization(const RVDClientAuthorizati
                          authorization.options(),
                          {}});
   });
-  if (done) return std::nullopt;
+  if (done) {
+    if (request_ != nullptr) request_->decisionStored();
+    return std::nullopt;
+  }
   logging::error(
       log_, "The record of %@ is not stored: %@", {RVValue(*clientId), RVValue(done.failure().message)});
   return storageError(done.failure().message);

@@ -39,7 +39,7 @@ void RequestContext::makeVoid(VoidReason reason) {
 void RequestContext::beginVoid(VoidReason reason) {
   {
     const std::lock_guard lock(reasonMutex_);
-    if (reason_) return;
+    if (reason_ && reason_ != VoidReason::kOutdated) return;
     reason_ = reason;
   }
   const std::lock_guard lock(callbacksMutex_);

@@ -1,6 +1,7 @@
 // What the daemon's services know about the request that they are called for.
 #pragma once
 
+#include <atomic>
 #include <functional>
 #include <list>
 #include <memory>
@@ -20,6 +21,7 @@ enum class VoidReason {
   kClientRevoked,
   kStopping,
   kLimitReached,
+  kOutdated,  // another request of the client was decided meanwhile; it is begun anew
 };
 
 // Counts the requests that wait, for each client and in all. Implemented by the request table.
@@ -61,7 +63,7 @@ class RequestContext {
 
   // Makes the request void and runs what was registered with onVoid, on this thread. Waits for an
   // effect that is being written (see unlessVoid); once this has returned, none is written any more. The
-  // first reason stays.
+  // first reason stays, but for kOutdated, which every other one replaces.
   void makeVoid(VoidReason reason);
 
   // The same without waiting: an effect that is being written may still come to its end, but none begins.
@@ -107,6 +109,15 @@ class RequestContext {
   // void for that reason.
   [[nodiscard]] std::unique_ptr<Waiting> beginWaiting();
 
+  // Says that the request has stored what was decided about its client.
+  void decisionStored() { hasStoredDecision_ = true; }
+  bool hasStoredDecision() const { return hasStoredDecision_; }
+
+  // Says that what is decided about the client has changed since the request began: what it still wants to
+  // ask may be settled already.
+  void outdate() { isOutdated_ = true; }
+  bool isOutdated() const { return isOutdated_; }
+
   // The request that the calling thread is working for; null where it works for none.
   static std::shared_ptr<RequestContext> current();
 
@@ -141,6 +152,9 @@ class RequestContext {
 
   std::mutex waitingMutex_;
   int waiting_ = 0;
+
+  std::atomic_bool hasStoredDecision_ = false;
+  std::atomic_bool isOutdated_ = false;
 };
 
 }  // namespace requests

@@ -50,6 +50,8 @@ RequestKey RequestKey::forOptions(std::string clientKey,
 struct RequestTable::Request {
   const RequestKey key;
   const bool isShared;
+  const std::shared_ptr<WaitingLimiter> limiter;
+  const Work work;
   const std::shared_ptr<RequestContext> context;
   std::vector<Caller> callers;  // protected by the table's lock
 };
@@ -108,9 +110,9 @@ void RequestTable::submit(RequestKey key,
                           std::shared_ptr<WaitingLimiter> limiter,
                           RVDictionary details,
                           Work work) {
-  auto context =
-      std::make_shared<RequestContext>(key.clientKey, std::move(limiter), std::move(details), key.evidence);
-  const auto request = std::make_shared<Request>(Request{std::move(key), true, std::move(context), {}});
+  const auto request =
+      makeRequest(std::move(key), true, std::move(limiter), std::move(details), std::move(work));
+  std::optional<VoidReason> reason;
   {
     const std::lock_guard lock(mutex_);
     const auto [first, last] = requests_.equal_range(request->key.clientKey);
@@ -118,46 +120,60 @@ void RequestTable::submit(RequestKey key,
       const Request& other = *entry.second;
       return other.isShared && other.key == request->key && !other.context->isVoid();
     });
-    const auto& joined = equal != last ? equal->second : request;
-    requestsOfCaller_.emplace(caller.name, joined);
-    joined->callers.push_back(std::move(caller));
-    if (joined != request) return;
-    requests_.emplace(request->key.clientKey, request);
+    if (equal != last) {
+      requestsOfCaller_.emplace(caller.name, equal->second);
+      equal->second->callers.push_back(std::move(caller));
+      return;
+    }
+    request->callers.push_back(std::move(caller));
+    reason = add(request);
   }
-  begin(request, std::move(work));
+  begin(request, reason);
 }
 
 void RequestTable::submitAlone(RequestKey key,
                                Caller caller,
                                std::shared_ptr<WaitingLimiter> limiter,
                                Work work) {
-  auto context = std::make_shared<RequestContext>(key.clientKey, std::move(limiter));
-  const auto request = std::make_shared<Request>(Request{std::move(key), false, std::move(context), {}});
-  {
-    const std::lock_guard lock(mutex_);
-    requestsOfCaller_.emplace(caller.name, request);
-    request->callers.push_back(std::move(caller));
-    requests_.emplace(request->key.clientKey, request);
-  }
-  begin(request, std::move(work));
-}
-
-void RequestTable::begin(const std::shared_ptr<Request>& request, Work work) {
-  const auto debt = std::make_shared<Debt>(this, request);
+  const auto request = makeRequest(std::move(key), false, std::move(limiter), {}, std::move(work));
+  request->callers.push_back(std::move(caller));
   std::optional<VoidReason> reason;
   {
     const std::lock_guard lock(mutex_);
-    for (const auto& [barrierReason, selection] : barriers_)
-      if (!reason && selection(request->key)) reason = barrierReason;
+    reason = add(request);
   }
+  begin(request, reason);
+}
+
+std::shared_ptr<RequestTable::Request> RequestTable::makeRequest(RequestKey key,
+                                                                 bool isShared,
+                                                                 std::shared_ptr<WaitingLimiter> limiter,
+                                                                 RVDictionary details,
+                                                                 Work work) {
+  auto context = std::make_shared<RequestContext>(key.clientKey, limiter, std::move(details), key.evidence);
+  return std::make_shared<Request>(
+      Request{std::move(key), isShared, std::move(limiter), std::move(work), std::move(context), {}});
+}
+
+// The lock is held. Answers why the request is to be void from the start, where it is.
+std::optional<VoidReason> RequestTable::add(const std::shared_ptr<Request>& request) {
+  for (const Caller& caller : request->callers) requestsOfCaller_.emplace(caller.name, request);
+  requests_.emplace(request->key.clientKey, request);
+  for (const auto& [reason, selection] : barriers_)
+    if (selection(request->key)) return reason;
+  return std::nullopt;
+}
+
+void RequestTable::begin(const std::shared_ptr<Request>& request, std::optional<VoidReason> reason) {
+  const auto debt = std::make_shared<Debt>(this, request);
   if (reason) {
     request->context->makeVoid(*reason);
     return debt->pay({});
   }
-  pool_.submit([this, debt, context = request->context, work = std::move(work)] {
-    const RequestContext::Scope scope(context);
+  pool_.submit([this, debt, request] {
+    const RequestContext::Scope scope(request->context);
     try {
-      if (!context->isVoid()) debt->run(work, debt);
+      if (!request->context->isVoid()) debt->run(request->work, debt);
       return;
     } catch (const std::exception& exception) {
       observer_.failed(exception.what());
@@ -170,6 +186,8 @@ void RequestTable::begin(const std::shared_ptr<Request>& request, Work work) {
 
 void RequestTable::finish(const std::shared_ptr<Request>& request, Outcome outcome) {
   std::vector<Caller> callers;
+  std::shared_ptr<Request> renewed;
+  std::optional<VoidReason> reason;
   {
     const std::lock_guard lock(mutex_);
     callers.swap(request->callers);
@@ -179,13 +197,25 @@ void RequestTable::finish(const std::shared_ptr<Request>& request, Outcome outco
     };
     remove(requests_, request->key.clientKey);
     for (const Caller& caller : callers) remove(requestsOfCaller_, caller.name);
+    if (request->context->hasStoredDecision()) {
+      const auto [first, last] = requests_.equal_range(request->key.clientKey);
+      for (auto entry = first; entry != last; ++entry)
+        if (entry->second->key.accountType == request->key.accountType) entry->second->context->outdate();
+    }
+    // Within the lock, so that no caller that leaves and no barrier is missed.
+    if (request->context->voidReason() == VoidReason::kOutdated && !callers.empty()) {
+      const auto& details = request->context->clientDetails();
+      renewed = makeRequest(request->key, request->isShared, request->limiter, details, request->work);
+      renewed->callers.swap(callers);
+      reason = add(renewed);
+    }
   }
-  if (const auto reason = request->context->voidReason()) {
-    outcome = {*reason == VoidReason::kLimitReached ? Outcome::Kind::kLimitReached : Outcome::Kind::kVoid,
+  observer_.ended(request->context);
+  if (renewed != nullptr) return begin(renewed, reason);
+  if (const auto voidReason = request->context->voidReason())
+    outcome = {*voidReason == VoidReason::kLimitReached ? Outcome::Kind::kLimitReached : Outcome::Kind::kVoid,
                false,
                std::nullopt};
-    observer_.endedVoid(request->context);
-  }
   for (const Caller& caller : callers) caller.answer(outcome);
 }
 

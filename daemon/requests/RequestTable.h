@@ -52,6 +52,10 @@ struct Outcome {
 
 // Runs requests on the pool, makes equal ones of one client one, and makes them void.
 //
+// When a request has stored a decision, the others of its client and account type are outdated: one that
+// then has yet to ask the user becomes void for that reason (see AlertService) and is begun anew, with the
+// same callers, so that nobody is asked what the decision has settled.
+//
 // Every caller's answer is called exactly once, on a thread of the pool or the one on which the plug-in
 // answers, or on the submitting thread where the request cannot even begin. Thread-safe; no lock is held
 // while an answer runs or is destroyed.
@@ -70,8 +74,8 @@ class RequestTable {
   struct Observer {
     // A plug-in's call threw this.
     std::function<void(const std::string& reason)> failed;
-    // A request that was void has come to its end; its callers are answered next.
-    std::function<void(const std::shared_ptr<RequestContext>& context)> endedVoid;
+    // A request has come to its end, and those that it outdates know it; its callers are answered next.
+    std::function<void(const std::shared_ptr<RequestContext>& context)> ended;
   };
 
   // pool: outlives this object. observer: its functions are called from any thread and do not throw.
@@ -116,7 +120,13 @@ class RequestTable {
   struct Request;
   class Debt;
 
-  void begin(const std::shared_ptr<Request>& request, Work work);
+  static std::shared_ptr<Request> makeRequest(RequestKey key,
+                                              bool isShared,
+                                              std::shared_ptr<WaitingLimiter> limiter,
+                                              RVDictionary details,
+                                              Work work);
+  std::optional<VoidReason> add(const std::shared_ptr<Request>& request);
+  void begin(const std::shared_ptr<Request>& request, std::optional<VoidReason> reason);
   void finish(const std::shared_ptr<Request>& request, Outcome outcome);
 
   RequestPool& pool_;

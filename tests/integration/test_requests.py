@@ -3,7 +3,7 @@
 import pytest
 
 from harness.agent import ALLOW, REFUSE
-from harness.application import options
+from harness.application import Pending, options
 from harness.expect import (
     ACCOUNTS_DOMAIN,
     GRANTED,
@@ -347,30 +347,32 @@ def test_beyond_the_limit_of_waiting_requests_a_client_is_turned_away_and_others
     agent = bare_world.agent()
     greedy = bare_world.application("org.example.Greedy", "Greedy")
     names = ["email", "user_photos", "user_likes"]
-    waiting = [greedy.start_request([name]) for name in names[:2]]
+    waiting = [greedy.start_request([name]) for name in names]
     alert = agent.next()
-    wait_until_waiting(bare_world, greedy, names[2])
+    waiting.remove(turned_away(waiting))
 
-    other = bare_world.application("org.example.Other", "Other")
-    third = other.start_request(["email"])
-    last = bare_world.application("org.example.Last", "Last")
-    wait_until_waiting(bare_world, last, "email")
+    clients = [bare_world.application("org.example." + name, name) for name in ("Other", "Last")]
+    asked = {client.start_request(["email"]): client for client in clients}
+    last = asked.pop(turned_away(asked))
+    (third, other), = asked.items()
 
     alert.allow()
     for _ in range(2):
         agent.next().allow()
     assert [request.answer() for request in [*waiting, third]] == [GRANTED] * 3
-    assert set(manager.authorizations()) == {"org.example.Greedy", "org.example.Other"}
+    assert set(manager.authorizations()) == {"org.example.Greedy", other.app_id}
     assert last.access() == ("none", [], {})
     pending = last.start_request(["email"])
     agent.next().allow()
     assert pending.answer() == GRANTED
 
 
-def wait_until_waiting(world, application, permission):
-    """Asks for something for which there is no room any more."""
+def turned_away(requests):
+    """The one for which there is no room: it alone is answered while nobody answers an alert."""
+    request = Pending.first_of(requests)
     with bus_error(LIMITS_EXCEEDED):
-        application.request([permission])
+        request.answer()
+    return request
 
 
 def test_a_request_that_needs_nobody_is_answered_while_others_wait(bare_world, standin):

@@ -88,8 +88,9 @@ const AgentAddress kNewerDesktop{":1.3", "/desktop"};
 class AnAlert : public testing::Test {
  protected:
   std::future<ZQResponseFlags> ask(std::shared_ptr<requests::RequestContext> context = nullptr,
-                                   const std::string& header = "header") {
-    return std::async(std::launch::async, [this, context, header]() -> ZQResponseFlags {
+                                   const std::string& header = "header",
+                                   bool endsRequest = true) {
+    return std::async(std::launch::async, [this, context, header, endsRequest]() -> ZQResponseFlags {
       const requests::RequestContext::Scope scope(context);
       const auto alert =
           service_.ZQUserNotificationCreate(kZQAllocatorDefault, 0, 0, nullptr, {{"header", header}});
@@ -97,12 +98,15 @@ class AnAlert : public testing::Test {
       ZQResponseFlags flags = 98;
       EXPECT_EQ(service_.ZQUserNotificationReceiveResponse(alert, 0, &flags), 0);
       service_.ZQRelease(alert);
+      if (context != nullptr && endsRequest) service_.requestEnded(context);
       return flags;
     });
   }
-  static std::shared_ptr<requests::RequestContext> request() {
+  static std::shared_ptr<requests::RequestContext> request(
+      const std::string& client = "client",
+      clients::Evidence evidence = clients::Evidence::kRegistered) {
     return std::make_shared<requests::RequestContext>(
-        "client", nullptr, RVDictionary{{"client_id", "org.example.App"}});
+        client, nullptr, RVDictionary{{"client_id", "org.example.App"}}, evidence);
   }
 
   FakeAgents agents_;
@@ -327,6 +331,95 @@ TEST_F(AnAlert, GetsItsOwnAnswerAmongManyThatComeAndGo) {
   user.join();
   EXPECT_EQ(wrong, 0);
   EXPECT_GE(allowed, 34);  // the even multiples of three, whose requests never became void
+}
+
+TEST_F(AnAlert, IsNotShownBeforeTheRequestOfItsClientThatWasAnsweredHasEnded) {
+  service_.registerAgent(kTerminal, AgentKind::kTerminal);
+  const auto first = request();
+  auto answer = ask(first, "first", false);
+  agents_.answer(agents_.next(), 0);
+  EXPECT_EQ(answer.get(), 0U);
+
+  auto second = ask(request(), "second");
+  for (int i = 0; i < 3; ++i) {
+    auto other = ask(request("other"), "other");
+    const auto shown = agents_.next();
+    EXPECT_EQ(*RVValueForKey(shown.description, "header"), RVValue("other"));
+    agents_.answer(shown, 1);
+    other.get();
+  }
+  service_.requestEnded(first);
+  const auto shown = agents_.next();
+  EXPECT_EQ(*RVValueForKey(shown.description, "header"), RVValue("second"));
+  agents_.answer(shown, 1);
+  EXPECT_EQ(second.get(), 1U);
+}
+
+TEST_F(AnAlert, WhoseQuestionMayBeSettledIsNotShownAndItsRequestIsOutdated) {
+  service_.registerAgent(kTerminal, AgentKind::kTerminal);
+  const auto first = request();
+  auto answer = ask(first, "first", false);
+  agents_.answer(agents_.next(), 0);
+  answer.get();
+
+  const auto second = request();
+  auto settled = ask(second, "second");
+  second->outdate();
+  service_.requestEnded(first);
+  EXPECT_EQ(settled.get(), 2U);
+  EXPECT_EQ(second->voidReason(), requests::VoidReason::kOutdated);
+  EXPECT_FALSE(agents_.isShowing());
+}
+
+TEST_F(AnAlert, OfARequestThatIsOutdatedAlreadyIsNotShown) {
+  service_.registerAgent(kTerminal, AgentKind::kTerminal);
+  const auto context = request();
+  context->outdate();
+  EXPECT_EQ(ask(context).get(), 2U);
+  EXPECT_EQ(context->voidReason(), requests::VoidReason::kOutdated);
+  EXPECT_FALSE(agents_.isShowing());
+}
+
+TEST_F(AnAlert, ThatIsShownIsTakenDownWhenWhatItAsksMayBeSettled) {
+  service_.registerAgent(kTerminal, AgentKind::kTerminal);
+  const auto context = request();
+  auto answer = ask(context);
+  const auto shown = agents_.next();
+  context->outdate();
+  service_.requestEnded(request());
+  EXPECT_EQ(answer.get(), 2U);
+  agents_.waitForDismissed(shown.alertID);
+}
+
+TEST(Turns, ComeOneAfterTheOtherForOneOwner) {
+  Turns turns;
+  const auto first = turns.join("a");
+  EXPECT_LT(first, turns.join("a"));
+}
+
+TEST(Turns, OfOneOwnerDelayAnotherByOneAtMost) {
+  Turns turns;
+  const auto shown = turns.join("many");
+  turns.reach(shown);
+  const auto second = turns.join("many");
+  const auto third = turns.join("many");
+  const auto other = turns.join("one");
+  EXPECT_LE(other, second);
+  EXPECT_LT(other, third);
+}
+
+TEST(Turns, AreNotWonByAskingAnewAfterEachAnswer) {
+  Turns turns;
+  turns.reach(turns.join("eager"));
+  const auto patient = turns.join("patient");
+  turns.reach(patient);
+  const auto waiting = turns.join("patient");
+  for (int i = 0; i < 3; ++i) {
+    const auto again = turns.join("eager");
+    if (again > waiting) return;  // the patient one's second comes before this
+    turns.reach(again);
+  }
+  FAIL() << "the one that asks anew was always first";
 }
 
 TEST(ThePauseOfAnAgent, GrowsToAMinute) {

@@ -4,6 +4,7 @@
 #include <atomic>
 #include <condition_variable>
 #include <future>
+#include <map>
 #include <stdexcept>
 #include <thread>
 #include <vector>
@@ -43,7 +44,7 @@ class TheTable : public testing::Test {
   TheTable()
       : table_(pool_,
                {[this](const std::string& reason) { failure_ = reason; },
-                [this](const auto&) { ++endedVoid_; }}) {}
+                [this](const auto& context) { endedVoid_ += context->isVoid() ? 1 : 0; }}) {}
 
   static RequestKey key(const std::string& client, RVDictionary options = {}) {
     return RequestKey::forOptions(client, clients::Evidence::kRegistered, "type", options);
@@ -150,6 +151,87 @@ TEST_F(TheTable, MakesEqualRequestsOfOneClientOne) {
   const auto barrier = table_.makeVoid(VoidReason::kClientRevoked, [](const auto&) { return true; });
   EXPECT_EQ(answers_.wait(3).size(), 3U);
   EXPECT_EQ(begun_, 1);
+}
+
+// Work that is made void as outdated at its first run, as an alert does it that need not be shown any more;
+// at its second run it is granted. Says that it has begun each time, and does not end before `go` is ready.
+RequestTable::Work outdatedOnce(std::atomic<int>& runs, std::shared_future<void> go = {}) {
+  return [&runs, go](const RVDAccessCompletion& completion) {
+    const bool isFirst = runs++ == 0;
+    runs.notify_all();
+    if (isFirst) {
+      RequestContext::current()->beginVoid(VoidReason::kOutdated);
+      if (go.valid()) go.wait();
+    }
+    completion(!isFirst, std::nullopt);
+  };
+}
+
+TEST_F(TheTable, BeginsAnOutdatedRequestAnewForTheSameCallers) {
+  std::atomic<int> runs = 0;
+  submit(key("a"), ":1", outdatedOnce(runs));
+  const auto outcome = answers_.wait(1).at(0);
+  EXPECT_EQ(outcome.kind, Kind::kDecided);
+  EXPECT_TRUE(outcome.granted);
+  EXPECT_EQ(runs, 2);
+  EXPECT_EQ(endedVoid_, 1);
+}
+
+TEST_F(TheTable, DoesNotBeginAnOutdatedRequestAnewForNobody) {
+  std::atomic<int> runs = 0;
+  std::promise<void> go;
+  submit(key("a"), ":1", outdatedOnce(runs, go.get_future().share()));
+  runs.wait(0);
+  table_.callerLeft(":1");
+  go.set_value();
+  pool_.stop();
+  EXPECT_EQ(runs, 1);
+}
+
+TEST_F(TheTable, DoesNotBeginAnOutdatedRequestAnewThatABarrierIsSetAgainst) {
+  std::atomic<int> runs = 0;
+  std::promise<void> go;
+  submit(key("a"), ":1", outdatedOnce(runs, go.get_future().share()));
+  runs.wait(0);
+  {
+    const auto barrier = table_.makeVoid(VoidReason::kClientRevoked, [](const auto&) { return true; });
+  }
+  go.set_value();
+  EXPECT_EQ(answers_.wait(1).at(0).kind, Kind::kVoid);
+  EXPECT_EQ(runs, 1);
+}
+
+TEST_F(TheTable, OutdatesTheOtherRequestsOfAClientWhenADecisionIsStored) {
+  std::map<std::string, std::shared_ptr<RequestContext>> contexts;
+  const auto wait = waiting();
+  const auto submitWaiting = [&](const std::string& name, const RequestKey& requestKey) {
+    const int begun = begun_;
+    submit(requestKey, ":1", [&, name, wait](const RVDAccessCompletion& completion) {
+      contexts[name] = RequestContext::current();
+      wait(completion);
+    });
+    waitForBegun(begun + 1);
+  };
+  submitWaiting("same client", key("a", {{"app_id", "1"}}));
+  submitWaiting("other client", key("b"));
+  submitWaiting("other type", RequestKey::forOptions("a", clients::Evidence::kRegistered, "other type", {}));
+
+  submit(key("a", {{"app_id", "2"}}), ":1", [](const RVDAccessCompletion& completion) {
+    completion(true, std::nullopt);
+  });
+  answers_.wait(1);
+  EXPECT_FALSE(contexts["same client"]->isOutdated()) << "nothing was stored";
+
+  submit(key("a", {{"app_id", "3"}}), ":1", [](const RVDAccessCompletion& completion) {
+    RequestContext::current()->decisionStored();
+    completion(true, std::nullopt);
+  });
+  answers_.wait(2);
+  EXPECT_TRUE(contexts["same client"]->isOutdated());
+  EXPECT_FALSE(contexts["other client"]->isOutdated());
+  EXPECT_FALSE(contexts["other type"]->isOutdated());
+  const auto barrier = table_.makeVoid(VoidReason::kStopping, [](const auto&) { return true; });
+  answers_.wait(5);
 }
 
 TEST_F(TheTable, KeepsRequestsThatDifferApart) {

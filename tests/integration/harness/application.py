@@ -1,5 +1,6 @@
 """Sample applications: each a connection of its own that asks rvd for access."""
 
+import concurrent.futures
 import os
 
 from gi.repository import GLib
@@ -23,6 +24,13 @@ class Pending:
     def answer(self):
         """Waits for the answer: (granted, error)."""
         return self._future.result(DEADLINE)
+
+    @staticmethod
+    def first_of(requests):
+        """Waits until one of them is answered, and tells which."""
+        by_future = {request._future: request for request in requests}
+        done, _ = concurrent.futures.wait(by_future, DEADLINE, concurrent.futures.FIRST_COMPLETED)
+        return by_future[next(iter(done))]
 
 
 def options(app_id="4711", permissions=None, audience=None, **others):
