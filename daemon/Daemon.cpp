@@ -41,6 +41,9 @@ constexpr std::size_t kRunningThreads = 4;
 // Threads beyond those for what the user's own tools have the daemon wait for, which no limit counts.
 constexpr std::size_t kThreadsForTools = 16;
 constexpr std::chrono::seconds kKeepIdleThreads{10};
+// For looking at the processes of those who call: a file system of theirs may never answer.
+constexpr std::chrono::seconds kInspectionDeadline{5};
+constexpr std::size_t kMostInspections = 16;
 
 // The languages as the header Accept-Language lists them: best first, each a little less wanted.
 std::string acceptLanguage(const std::vector<std::string>& languages) {
@@ -97,7 +100,17 @@ struct Daemon::Bus {
         applications(places.applicationDirectories, places.languages),
         entitlements(places.entitlementsDirectory, places.entitlementsTrust, log),
         clients(applications, entitlements, "An unknown application"),
-        identities(senders, applications, ::geteuid()) {}
+        identities(
+            senders,
+            {clients::makeInspect(std::make_shared<clients::SystemProcesses>(),
+                                  clients::ProcessInspector("/proc", ::geteuid()),
+                                  applications),
+             kInspectionDeadline,
+             kMostInspections},
+            applications,
+            [this](auto work) { loop.post(std::move(work)); },
+            ::geteuid(),
+            log) {}
 
   const std::unique_ptr<sdbus::IConnection> connection;
   bus::BusLoop loop;
@@ -226,8 +239,8 @@ void Daemon::serve(const Places& places) {
                                       places.languages);
 
   work.object = sdbus::createObject(*bus_->connection, bus::kObjectPath);
-  work.dispatcher = std::make_unique<bus::Dispatcher>(
-      *work.object, bus_->loop, bus_->senders, bus_->identities, work.pool, log_);
+  work.dispatcher =
+      std::make_unique<bus::Dispatcher>(*work.object, bus_->loop, bus_->identities, work.pool, log_);
   const bus::Parts parts{log_,
                          settings_,
                          *storage.accounts,
@@ -273,9 +286,7 @@ void Daemon::serve(const Places& places) {
 }
 
 void Daemon::connectionLeft(const std::string& uniqueName) {
-  bus_->senders.forget(uniqueName);
   bus_->identities.forget(uniqueName);
-  work_->accountsService->callerLeft(uniqueName);
   work_->table.callerLeft(uniqueName);
   work_->alerts.agentsLeft(uniqueName);
   bus_->agents.removeAllOf(uniqueName);

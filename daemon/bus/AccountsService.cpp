@@ -75,6 +75,7 @@ AccountsService::AccountsService(sdbus::IObject& object, Dispatcher& dispatcher,
       parts_(std::move(parts)) {
   using SharedCall = const std::shared_ptr<Call>&;
   dispatcher.serve(interfaces::kAccounts1,
+                   Callers::kAll,
                    interfaces::methodsOfAccounts1(),
                    {{"Register", [this](SharedCall call) { registerCaller(call); }},
                     {"RequestAccess", [this](SharedCall call) { requestAccess(call); }},
@@ -99,16 +100,15 @@ void AccountsService::registerCaller(const std::shared_ptr<Call>& call) {
   switch (parts_.identities.registerAs(call->sender(), id)) {
     case clients::Registration::kRegistered:
       break;
-    case clients::Registration::kOtherUser:
-      throw sdbus::Error(kAccessDenied, "Only the user whose accounts these are may call");
+    case clients::Registration::kNotPossible:
+      throw sdbus::Error(kAccessDenied, "Only programs that are known to run in no sandbox may register");
     case clients::Registration::kAlreadyIdentified:
       throw sdbus::Error(kAlreadyIdentified, "It is known which application this connection is");
     case clients::Registration::kUnknownApplication:
       throw sdbus::Error(kUnknownApplication, "No installed application has this ID");
-  }
-  {
-    const std::lock_guard lock(mutex_);
-    connections_[id].insert(call->sender());
+    case clients::Registration::kSandboxed:
+      throw sdbus::Error(kUnknownApplication,
+                         "The application that has this ID runs in a sandbox, which says so itself");
   }
   call->reply();
 }
@@ -196,33 +196,18 @@ void AccountsService::getCredential(const std::shared_ptr<Call>& call) {
   });
 }
 
-void AccountsService::callerLeft(const std::string& uniqueName) {
-  const std::lock_guard lock(mutex_);
-  for (auto entry = connections_.begin(); entry != connections_.end();) {
-    entry->second.erase(uniqueName);
-    entry = entry->second.empty() ? connections_.erase(entry) : std::next(entry);
-  }
-}
-
 void AccountsService::accessChanged(const std::string& accountType,
                                     const std::vector<std::string>& clientIDs) {
-  std::vector<std::string> receivers;
-  {
-    const std::lock_guard lock(mutex_);
-    for (const std::string& id : clientIDs) {
-      const auto entry = connections_.find(id);
-      if (entry == connections_.end()) continue;
-      receivers.insert(receivers.end(), entry->second.begin(), entry->second.end());
-    }
-  }
-  for (const std::string& receiver : receivers) {
-    try {
-      auto signal = object_.createSignal(interfaces::kAccounts1, "AccessChanged");
-      signal.setDestination(receiver);
-      signal << accountType;
-      object_.emitSignal(signal);
-      loop_.sendRest();
-    } catch (const sdbus::Error&) {  // The bus is gone, and the receiver with it.
+  for (const std::string& id : clientIDs) {
+    for (const std::string& receiver : parts_.identities.connectionsOf(id)) {
+      try {
+        auto signal = object_.createSignal(interfaces::kAccounts1, "AccessChanged");
+        signal.setDestination(receiver);
+        signal << accountType;
+        object_.emitSignal(signal);
+        loop_.sendRest();
+      } catch (const sdbus::Error&) {  // The bus is gone, and the receiver with it.
+      }
     }
   }
 }

@@ -1,11 +1,7 @@
 // What applications call: com.zentor.rvd.Accounts1.
 #pragma once
 
-#include <cstdint>
-#include <map>
 #include <memory>
-#include <mutex>
-#include <set>
 #include <string>
 #include <vector>
 
@@ -18,9 +14,6 @@ class AccountsService {
  public:
   // Registers the interface with the object. The references outlive this object.
   AccountsService(sdbus::IObject& object, Dispatcher& dispatcher, BusLoop& loop, Parts parts);
-
-  // On the bus thread, when a connection has left.
-  void callerLeft(const std::string& uniqueName);
 
   // Tells the connections of the clients that their access was changed by someone else. From any thread,
   // without a lock.
@@ -37,9 +30,6 @@ class AccountsService {
   Dispatcher& dispatcher_;
   BusLoop& loop_;
   const Parts parts_;
-
-  std::mutex mutex_;
-  std::map<std::string, std::set<std::string>> connections_;  // by client ID; guarded by mutex_
 };
 
 }  // namespace bus

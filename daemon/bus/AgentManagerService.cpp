@@ -16,6 +16,7 @@ AgentManagerService::AgentManagerService(Dispatcher& dispatcher,
       alerts_(alerts) {
   using SharedCall = const std::shared_ptr<Call>&;
   dispatcher.serve(interfaces::kAgentManager1,
+                   Callers::kUnconfined,
                    interfaces::methodsOfAgentManager1(),
                    {{"RegisterAgent", [this](SharedCall call) { registerAgent(*call); }},
                     {"UnregisterAgent", [this](SharedCall call) { unregisterAgent(*call); }}});

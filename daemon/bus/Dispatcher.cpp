@@ -20,19 +20,18 @@ bool isOurs(std::string_view name) {
 
 Dispatcher::Dispatcher(sdbus::IObject& object,
                        BusLoop& loop,
-                       Senders& senders,
                        clients::Identities& identities,
                        requests::RequestPool& pool,
                        RVLogService& log)
     : object_(object),
       loop_(loop),
-      senders_(senders),
       identities_(identities),
       pool_(pool),
       log_(log) {
 }
 
 void Dispatcher::serve(const std::string& interface,
+                       Callers callers,
                        const std::vector<interfaces::Method>& methods,
                        std::map<std::string, Handler> handlers) {
   for (const auto& method : methods) {
@@ -44,24 +43,32 @@ void Dispatcher::serve(const std::string& interface,
                            method.inputNames,
                            method.outputSignature,
                            method.outputNames,
-                           [this, handle = std::move(handler->second)](sdbus::MethodCall message) {
-                             dispatch(std::move(message), handle);
+                           [this, callers, handle = std::move(handler->second)](sdbus::MethodCall message) {
+                             dispatch(std::move(message), callers, handle);
                            });
   }
 }
 
-void Dispatcher::dispatch(sdbus::MethodCall message, const Handler& handler) noexcept {
+void Dispatcher::dispatch(sdbus::MethodCall message, Callers callers, const Handler& handler) noexcept {
   try {
     const auto call = std::make_shared<Call>(std::move(message), loop_);
-    guarded(*call, [&] {
-      senders_.learn(call->sender());
-      if (!identities_.isOwnUser(call->sender()))
-        throw sdbus::Error(kAccessDenied, "Only the user whose accounts these are may call");
-      handler(call);
+    const bool isTaken = identities_.whenIdentified(call->sender(), [this, call, callers, &handler] {
+      guarded(*call, [&] {
+        checkCaller(call->sender(), callers);
+        handler(call);
+      });
     });
+    if (!isTaken) call->fail(kLimitsExceeded, "Too many calls wait until it is known who makes them");
   } catch (const std::exception& exception) {  // Not even the call could be kept: there is no memory left.
     logging::error(log_, "A call could not be taken: %@", {exception.what()});
   }
+}
+
+void Dispatcher::checkCaller(const std::string& uniqueName, Callers callers) const {
+  if (!identities_.isOwnUser(uniqueName))
+    throw sdbus::Error(kAccessDenied, "Only the user whose accounts these are may call");
+  if (callers == Callers::kUnconfined && !identities_.isUnconfined(uniqueName))
+    throw sdbus::Error(kAccessDenied, "Only programs that are known to run in no sandbox may call");
 }
 
 void Dispatcher::onPool(const std::shared_ptr<Call>& call, std::function<void()> work) {

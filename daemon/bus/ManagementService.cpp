@@ -45,6 +45,7 @@ ManagementService::ManagementService(sdbus::IObject& object,
   };
   using Self = ManagementService;
   dispatcher.serve(interfaces::kManagement1,
+                   Callers::kUnconfined,
                    interfaces::methodsOfManagement1(),
                    {{"AddAccount", handler(&Self::addAccount)},
                     {"RemoveAccount", handler(&Self::removeAccount)},

@@ -2,61 +2,61 @@
 
 #include <sdbus-c++/sdbus-c++.h>
 
+#include <cstdint>
 #include <map>
+#include <optional>
+#include <utility>
 
 namespace bus {
+namespace {
+
+constexpr const char* kDriver = "org.freedesktop.DBus";
+constexpr std::uint64_t kTimeout = 10'000'000;  // microseconds
+
+clients::BusDriver::Credentials credentialsIn(sdbus::MethodReply& reply) {
+  std::map<std::string, sdbus::Variant> entries;
+  reply >> entries;
+  const auto number = [&](const char* key) -> std::optional<std::uint32_t> {
+    const auto entry = entries.find(key);
+    if (entry == entries.end() || entry->second.peekValueType() != "u") return std::nullopt;
+    return entry->second.get<std::uint32_t>();
+  };
+  clients::BusDriver::Credentials credentials;
+  credentials.uid = number("UnixUserID");
+  if (const auto pid = number("ProcessID")) credentials.pid = static_cast<pid_t>(*pid);
+  return credentials;
+}
+
+}  // namespace
 
 Senders::Senders(sdbus::IConnection& connection)
-    : bus_(sdbus::createProxy(connection, "org.freedesktop.DBus", "/org/freedesktop/DBus")) {
+    : bus_(sdbus::createProxy(connection, kDriver, "/org/freedesktop/DBus")) {
 }
 
 Senders::~Senders() = default;
 
-void Senders::learn(const std::string& uniqueName) {
-  {
-    const std::lock_guard lock(mutex_);
-    if (known_.contains(uniqueName)) return;
-  }
-  const Credentials credentials = ask(uniqueName);
-  const std::lock_guard lock(mutex_);
-  known_.insert_or_assign(uniqueName, credentials);
-}
-
-void Senders::forget(const std::string& uniqueName) {
-  const std::lock_guard lock(mutex_);
-  known_.erase(uniqueName);
-}
-
-std::optional<uid_t> Senders::uid(const std::string& uniqueName) {
-  const std::lock_guard lock(mutex_);
-  const auto entry = known_.find(uniqueName);
-  return entry != known_.end() ? entry->second.uid : std::nullopt;
-}
-
-std::optional<pid_t> Senders::pid(const std::string& uniqueName) {
-  const std::lock_guard lock(mutex_);
-  const auto entry = known_.find(uniqueName);
-  return entry != known_.end() ? entry->second.pid : std::nullopt;
-}
-
-Senders::Credentials Senders::ask(const std::string& uniqueName) {
-  Credentials credentials;
+void Senders::ask(const std::string& uniqueName, Answered answered) {
+  const auto answer = std::make_shared<Answered>(std::move(answered));
   try {
-    auto question = bus_->createMethodCall("org.freedesktop.DBus", "GetConnectionCredentials");
+    auto question = bus_->createMethodCall(kDriver, "GetConnectionCredentials");
     question << uniqueName;
-    auto answer = question.send(0);
-    std::map<std::string, sdbus::Variant> entries;
-    answer >> entries;
-    const auto number = [&](const char* key) -> std::optional<std::uint32_t> {
-      const auto entry = entries.find(key);
-      if (entry == entries.end() || entry->second.peekValueType() != "u") return std::nullopt;
-      return entry->second.get<std::uint32_t>();
-    };
-    credentials.uid = number("UnixUserID");
-    if (const auto pid = number("ProcessID")) credentials.pid = static_cast<pid_t>(*pid);
-  } catch (const sdbus::Error&) {  // It has left already.
+    bus_->callMethod(
+        question,
+        [answer](sdbus::MethodReply& reply, const sdbus::Error* error) {
+          Credentials credentials;
+          try {
+            // The bus delivers the reply of anybody who guesses the call's number.
+            if (error == nullptr && reply.getSender() == kDriver) credentials = credentialsIn(reply);
+          } catch (const sdbus::Error&) {  // It is none that the bus would give.
+            credentials = {};
+          }
+          (*answer)(credentials);
+        },
+        kTimeout);
+    return;
+  } catch (const sdbus::Error&) {  // The bus is gone.
   }
-  return credentials;
+  (*answer)({});
 }
 
 }  // namespace bus

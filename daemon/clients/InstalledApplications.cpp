@@ -13,7 +13,6 @@ namespace clients {
 namespace {
 
 constexpr std::size_t kMaximalEntrySize = 512 * 1024;
-constexpr std::size_t kMaximalIDSize = 255;
 constexpr std::size_t kMaximalNameLength = 64;  // code points
 constexpr int kMaximalProbes = 64;              // directories looked into for one ID
 constexpr std::string_view kSection = "Desktop Entry";
@@ -48,6 +47,26 @@ std::string entryFile(const std::string& directory, std::string_view id, int& pr
 bool isShownAsItIs(std::string_view id) {
   return !id.empty() && id.size() <= kMaximalIDSize && id.find('/') == std::string_view::npos &&
          base::displayName(id, kMaximalIDSize) == id;
+}
+
+// Whether the data directory is one into which Flatpak or snapd puts the entries of its applications.
+bool isOfSandboxes(const std::string& directory) {
+  std::string_view path = directory;
+  while (path.ends_with('/')) path.remove_suffix(1);
+  return path.ends_with("/flatpak/exports/share") || path.ends_with("/snapd/desktop");
+}
+
+// Whether the entry is one that Flatpak or snapd wrote.
+bool isOfSandbox(const config::IniSection& entry) {
+  return entry.value("X-Flatpak") != nullptr || entry.value("X-SnapInstanceName") != nullptr;
+}
+
+std::optional<config::IniSection> readEntry(const std::string& path) {
+  const auto text = base::readFile(path, kMaximalEntrySize);
+  if (!text) return std::nullopt;
+  const auto file = config::parseIni(*text, path, config::IniFlavour::kDesktopEntry);
+  const config::IniSection* entry = file ? file->section(kSection) : nullptr;
+  return entry != nullptr ? std::optional(*entry) : std::nullopt;
 }
 
 bool isTrue(const std::string* value) {
@@ -88,28 +107,33 @@ InstalledApplications::InstalledApplications(std::vector<std::string> directorie
       languages_(std::move(languages)) {
 }
 
+InstalledApplication namedByItsID(const std::string& id) {
+  return {id, shownName(id, ""), "", false};
+}
+
 std::optional<InstalledApplication> InstalledApplications::find(std::string_view id) const {
   if (!isShownAsItIs(id)) return std::nullopt;
-  std::string path;
+  bool isThere = false;
+  bool belongsToSandbox = false;
+  std::optional<config::IniSection> entry;  // the best directory's
   for (const std::string& directory : directories_) {
     int probes = kMaximalProbes;
-    path = entryFile(directory + "/applications", id, probes);
-    if (!path.empty()) break;
+    const std::string path = entryFile(directory + "/applications", id, probes);
+    if (path.empty()) continue;
+    auto found = readEntry(path);
+    if (isOfSandboxes(directory) || (found && isOfSandbox(*found))) belongsToSandbox = true;
+    if (!std::exchange(isThere, true)) entry = std::move(found);
   }
-  if (path.empty()) return std::nullopt;
-  const auto text = base::readFile(path, kMaximalEntrySize);
-  if (!text) return std::nullopt;
-  const auto file = config::parseIni(*text, path, config::IniFlavour::kDesktopEntry);
-  const config::IniSection* entry = file ? file->section(kSection) : nullptr;
-  if (entry == nullptr || isTrue(entry->value("Hidden"))) return std::nullopt;
+  if (!entry || isTrue(entry->value("Hidden"))) return std::nullopt;
   const std::string* type = entry->value("Type");
   if (type == nullptr || *type != "Application") return std::nullopt;
   const std::string* name = entry->value("Name", languages_);
   const std::string* icon = entry->value("Icon", languages_);
-  const std::string shownID = shownName(id, "");
-  return InstalledApplication{std::string(id),
-                              name != nullptr ? shownName(*name, shownID) : shownID,
-                              icon != nullptr && base::isUTF8(*icon) ? *icon : ""};
+  InstalledApplication application = namedByItsID(std::string(id));
+  if (name != nullptr) application.name = shownName(*name, application.name);
+  if (icon != nullptr && base::isUTF8(*icon)) application.icon = *icon;
+  application.belongsToSandbox = belongsToSandbox;
+  return application;
 }
 
 }  // namespace clients

@@ -1,6 +1,7 @@
 // The applications that are installed for the user, from their desktop entries.
 #pragma once
 
+#include <cstddef>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -8,11 +9,19 @@
 
 namespace clients {
 
+constexpr std::size_t kMaximalIDSize = 255;  // of an application's ID, in bytes
+
 struct InstalledApplication {
   std::string id;    // the desktop entry's ID, without ".desktop"
   std::string name;  // for display, in the user's language; the ID where the entry has none to show
   std::string icon;  // a name or a path; may be empty
+  // Whether an entry of this ID, in whichever directory, was put there by Flatpak or snapd: then the
+  // application runs in a sandbox, and no program outside of one is it.
+  bool belongsToSandbox = false;
 };
+
+// An application that nothing is known of but its ID.
+InstalledApplication namedByItsID(const std::string& id);
 
 // Where desktop entries are looked for, best first, from the values of XDG_DATA_HOME, HOME and
 // XDG_DATA_DIRS (empty where one is not set). Relative directories do not count.

@@ -1,5 +1,5 @@
 pkg_check_modules(ICU REQUIRED IMPORTED_TARGET icu-uc)
 rvd_test(clients_tests
-  SOURCES unit/clients_applications_test.cpp unit/clients_directory_test.cpp
-          unit/clients_identities_test.cpp unit/clients_names_test.cpp
+  SOURCES unit/clients_applications_test.cpp unit/clients_directory_test.cpp unit/clients_identities_test.cpp
+          unit/clients_inspector_test.cpp unit/clients_names_test.cpp unit/clients_units_test.cpp
   LIBRARIES rvd_clients rvd_fakes PkgConfig::ICU)
