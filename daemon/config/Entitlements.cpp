@@ -2,10 +2,15 @@
 
 #include <dirent.h>
 #include <fcntl.h>
+#include <sys/inotify.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include <algorithm>
+#include <array>
 #include <cerrno>
+#include <climits>
+#include <cstdint>
 #include <cstring>
 #include <utility>
 #include <vector>
@@ -139,24 +144,45 @@ base::Result<ByClient> readPolicyFile(const FileDescriptor& directory,
 Entitlements::Entitlements(std::string directory, PolicyTrust trust, RVLogService& log)
     : directory_(std::move(directory)),
       trust_(std::move(trust)),
-      log_(log) {
-  reload();
+      log_(log),
+      changes_(watch()),
+      byClient_(read()) {
 }
 
-void Entitlements::reload() {
-  auto byClient = std::make_shared<const ByClient>(read());
-  const std::lock_guard lock(mutex_);
-  byClient_ = std::move(byClient);
+// Made anew for each reading, before it, since a directory that was exchanged is not the one that was
+// watched.
+base::FileDescriptor Entitlements::watch() const {
+  const auto parts = partsBelow(trust_.top, directory_);
+  FileDescriptor changes(::inotify_init1(IN_NONBLOCK | IN_CLOEXEC));
+  if (!parts || !changes.isOpen()) return changes;  // such a path is never believed
+  constexpr std::uint32_t kEvents = IN_ATTRIB | IN_CLOSE_WRITE | IN_CREATE | IN_DELETE | IN_DELETE_SELF |
+                                    IN_MOVED_FROM | IN_MOVED_TO | IN_MOVE_SELF | IN_DONT_FOLLOW | IN_ONLYDIR;
+  std::string path = trust_.top;
+  for (auto part = parts->begin();; ++part) {
+    // Below a directory that is not there, or that is none, nothing can change before it does.
+    if (::inotify_add_watch(changes.get(), path.c_str(), kEvents) < 0) {
+      if (errno == ENOENT || errno == ENOTDIR || errno == ELOOP) return changes;
+      return FileDescriptor();
+    }
+    if (part == parts->end()) return changes;
+    path += (path.ends_with('/') ? "" : "/") + *part;
+  }
+}
+
+bool Entitlements::hasChanged() const {
+  if (!changes_.isOpen()) return true;
+  std::array<char, sizeof(inotify_event) + NAME_MAX + 1> event;
+  return ::read(changes_.get(), event.data(), event.size()) >= 0 || errno != EAGAIN;
 }
 
 Entitlements::Names Entitlements::entitlementsOfClient(std::string_view clientID) const {
-  std::shared_ptr<const ByClient> byClient;
-  {
-    const std::lock_guard lock(mutex_);
-    byClient = byClient_;
+  const std::lock_guard lock(mutex_);
+  if (hasChanged()) {
+    changes_ = watch();
+    byClient_ = read();
   }
-  const auto entry = byClient->find(clientID);
-  return entry != byClient->end() ? entry->second : Names();
+  const auto entry = byClient_.find(clientID);
+  return entry != byClient_.end() ? entry->second : Names();
 }
 
 Entitlements::ByClient Entitlements::read() const {

@@ -261,6 +261,19 @@ def test_a_client_with_default_access_needs_neither_account_nor_server(bare_worl
     assert application.request([], app_id="") == INVALID_OPTIONS
 
 
+def test_an_entitlement_counts_from_the_next_request_after_its_file_has_changed(wired_world):
+    wired_world.manager().add_account()
+    agent = wired_world.agent()
+    application = wired_world.application()
+    pending = application.start_request(["email"])
+    alert = agent.next()
+    wired_world.entitle(PHOTO, ALL_ACCESS)
+    assert application.request(["user_photos"]) == GRANTED
+    assert not pending.answered
+    alert.refuse()
+    assert pending.answer() == USER_REFUSED
+
+
 def test_a_client_with_access_to_all_accounts_is_granted_before_anything_is_looked_at(bare_world):
     bare_world.entitle(PHOTO, ALL_ACCESS, DEFAULT_ACCESS)
     bare_world.start_bus()

@@ -15,7 +15,6 @@ class TheClientDirectory : public testing::Test {
     files_.write("share/applications/org.example.App.desktop",
                  "[Desktop Entry]\nType=Application\nName=App\nIcon=app\n");
     files_.write("entitlements.d/app.conf", "[org.example.App]\nEntitlements=e;\n");
-    entitlements_.reload();
   }
 
   support::TemporaryDirectory files_;
@@ -52,7 +51,6 @@ TEST_F(TheClientDirectory, NeverLeavesAClientWithoutAName) {
 
 TEST_F(TheClientDirectory, KnowsAClientThatNothingIsKnownAbout) {
   files_.write("entitlements.d/unknown.conf", "[Eine unbekannte Anwendung]\nEntitlements=e\n");
-  entitlements_.reload();
   const auto client = directory_.unknownClient();
   EXPECT_EQ(client->bundleID(), std::nullopt);
   EXPECT_EQ(client->localizedAppName(), "Eine unbekannte Anwendung");
@@ -73,7 +71,6 @@ TEST_F(TheClientDirectory, KeepsTheNameThatAConnectionWasKnownBy) {
 TEST_F(TheClientDirectory, GivesTheEntitlementsOfTheMoment) {
   const auto before = directory_.clientForID("org.example.App");
   files_.write("entitlements.d/app.conf", "[org.example.App]\nEntitlements=f;\n");
-  entitlements_.reload();
   EXPECT_TRUE(before->hasEntitlement("e"));
   EXPECT_TRUE(directory_.clientForID("org.example.App")->hasEntitlement("f"));
   EXPECT_FALSE(directory_.clientForID("org.example.App")->hasEntitlement("e"));

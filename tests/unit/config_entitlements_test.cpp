@@ -4,6 +4,7 @@
 
 #include <atomic>
 #include <cstdio>
+#include <cstdlib>
 #include <filesystem>
 #include <thread>
 
@@ -71,12 +72,53 @@ TEST_F(ThePolicy, ThatIsNotThereGivesNothingSilently) {
   EXPECT_TRUE(log_.lines().empty());
 }
 
-TEST_F(ThePolicy, IsReadAnewOnDemand) {
-  Entitlements entitlements = read();
-  directory_.write("entitlements.d/first.conf", "[org.example.App]\nEntitlements=c\n");
+TEST_F(ThePolicy, IsReadAnewWhenAFileChanges) {
+  const Entitlements entitlements = read();
   EXPECT_EQ(entitlements.entitlementsOfClient("org.example.App"), given_);
-  entitlements.reload();
+  directory_.write("entitlements.d/first.conf", "[org.example.App]\nEntitlements=c\n");
   EXPECT_EQ(entitlements.entitlementsOfClient("org.example.App"), Names{"c"});
+  directory_.write("entitlements.d/second.conf", "[org.example.App]\nEntitlements=d\n");
+  EXPECT_EQ(entitlements.entitlementsOfClient("org.example.App"), (Names{"c", "d"}));
+  std::filesystem::remove(path("first.conf"));
+  EXPECT_EQ(entitlements.entitlementsOfClient("org.example.App"), Names{"d"});
+  ASSERT_EQ(::chmod(path("second.conf").c_str(), 0666), 0);
+  EXPECT_EQ(entitlements.entitlementsOfClient("org.example.App"), Names{});
+}
+
+TEST_F(ThePolicy, IsReadAnewWhenADirectoryAboveItChanges) {
+  directory_.write("a/b/first.conf", kPolicy);
+  const Entitlements entitlements(directory_.path("a/b"), {::getuid(), directory_.path()}, log_);
+  const auto names = [&] { return entitlements.entitlementsOfClient("org.example.App"); };
+  EXPECT_EQ(names(), given_);
+  for (const std::string& directory : {directory_.path(), directory_.path("a"), directory_.path("a/b")}) {
+    ASSERT_EQ(::chmod(directory.c_str(), 0777), 0);
+    EXPECT_EQ(names(), Names{}) << directory;
+    ASSERT_EQ(::chmod(directory.c_str(), 0755), 0);
+    EXPECT_EQ(names(), given_) << directory;
+  }
+  std::filesystem::rename(directory_.path("a"), directory_.path("aside"));
+  EXPECT_EQ(names(), Names{});
+  directory_.write("a/b/first.conf", "[org.example.App]\nEntitlements=c\n");
+  EXPECT_EQ(names(), Names{"c"});
+}
+
+TEST_F(ThePolicy, ThatSomebodyElseMayWriteByAnAccessListIsNotBelieved) {
+  const auto allow = [](const std::string& file) {
+    return std::system(("setfacl -m u:12345:rw '" + file + "' 2>/dev/null").c_str()) == 0;
+  };
+  if (!allow(path("first.conf"))) GTEST_SKIP() << "the file system keeps no access lists";
+  expectRefusal("file");
+  ASSERT_EQ(std::system(("setfacl -b '" + path("first.conf") + "'").c_str()), 0);
+  EXPECT_EQ(namesAfterReading(), given_);
+  ASSERT_TRUE(allow(directory_.path("entitlements.d")));
+  expectRefusal("directory");
+}
+
+TEST_F(ThePolicy, IsJudgedByTheFileAndNotByHowManyNamesItHas) {
+  std::filesystem::create_hard_link(path("first.conf"), directory_.path("elsewhere"));
+  EXPECT_EQ(namesAfterReading(), given_);
+  ASSERT_EQ(::chmod(directory_.path("elsewhere").c_str(), 0666), 0);
+  expectRefusal("changed under its other name");
 }
 
 TEST_F(ThePolicy, InAFileThatOthersCanWriteIsNotBelieved) {
@@ -164,10 +206,10 @@ TEST_F(ThePolicy, OfOneBadFileLeavesTheOthersStanding) {
 }
 
 TEST_F(ThePolicy, IsEitherTheOldOrTheNewOneWhileAFileIsReplaced) {
-  Entitlements entitlements = read();
+  const Entitlements entitlements = read();
   std::atomic<bool> isDone = false;
   std::thread replacer([this, &isDone] {
-    for (int round = 0; round < 1000; ++round) {
+    for (int round = 0; round < 10'000; ++round) {
       directory_.write("next", round % 2 != 0 ? kPolicy : "[org.example.App]\nEntitlements=c;d\n");
       std::rename(directory_.path("next").c_str(), path("first.conf").c_str());
     }
@@ -175,11 +217,11 @@ TEST_F(ThePolicy, IsEitherTheOldOrTheNewOneWhileAFileIsReplaced) {
   });
   const Names other{"c", "d"};
   do {
-    entitlements.reload();
     const Names names = entitlements.entitlementsOfClient("org.example.App");
     EXPECT_TRUE(names == given_ || names == other);
   } while (!isDone);
   replacer.join();
+  EXPECT_EQ(entitlements.entitlementsOfClient("org.example.App"), given_);
   EXPECT_TRUE(log_.lines().empty());
 }
 

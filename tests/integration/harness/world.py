@@ -133,7 +133,7 @@ class World:
             file.write(f"[Desktop Entry]\nType=Application\nName={name or app_id}\nExec=/bin/true\n{others}")
 
     def entitle(self, app_id, *entitlements):
-        """Gives a client entitlements, before rvd is started."""
+        """Gives a client entitlements."""
         path = os.path.join(self.entitlements_dir, f"{app_id}.conf")
         with open(path, "w", encoding="utf-8") as file:
             file.write(f"[{app_id}]\nEntitlements={''.join(e + ';' for e in entitlements)}\n")
