@@ -63,9 +63,9 @@ class World:
         self._disposables.append(disposable)
         return disposable
 
-    def start(self, arguments, **others):
+    def start(self, arguments, environment=None, **others):
         """Starts a program in this world."""
-        process = Process(arguments, self.environment, **others)
+        process = Process(arguments, environment or self.environment, **others)
         self._processes.append(process)
         return process
 
@@ -91,9 +91,9 @@ class World:
             "--entitlements-dir", self.entitlements_dir,
         ]  # fmt: skip
 
-    def start_daemon(self):
-        """Starts rvd and waits until it is on the bus."""
-        self.daemon = self.start(self.daemon_arguments())
+    def start_daemon(self, wrapper=()):
+        """Starts rvd, by a command where one is given, and waits until it is on the bus."""
+        self.daemon = self.start([*wrapper, *self.daemon_arguments()])
         self.daemons.append(self.daemon)
         self.daemon.on_end(self._watch.wake)
         self._watch.wait(owned=True, while_running=self.daemon)
