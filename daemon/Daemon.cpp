@@ -134,6 +134,7 @@ struct Daemon::Work {
             acceptLanguage(places.languages),
             log),
         alerts(bus.agents, state::randomIdentifier, alerts::AlertService::growingPause),
+        rate(settings.callsPerSecond, std::chrono::steady_clock::now),
         pool(kRunningThreads,
              kRunningThreads + settings.waitingRequests + kThreadsForTools,
              kKeepIdleThreads),
@@ -152,6 +153,7 @@ struct Daemon::Work {
   http::TransferThread transfers;
   http::FacebookRequests facebookRequests;
   alerts::AlertService alerts;
+  requests::RateLimit rate;
   requests::RequestPool pool;
   requests::RequestTable table;
   std::vector<std::unique_ptr<plugins::PluginModule>> plugins;
@@ -255,6 +257,7 @@ void Daemon::serve(const Places& places) {
                          work.plugins,
                          work.pool,
                          work.table,
+                         work.rate,
                          std::make_shared<requests::WaitingLimits>(
                              work.pool, settings_.waitingRequestsPerClient, settings_.waitingRequests),
                          std::make_shared<requests::UnlimitedWaiting>(work.pool)};

@@ -113,6 +113,15 @@ void AccountsService::registerCaller(const std::shared_ptr<Call>& call) {
   call->reply();
 }
 
+// Those that nothing is known about are counted as one, since they are as many as somebody makes of them.
+void AccountsService::checkRate(const std::string& uniqueName) const {
+  const auto identity = parts_.identities.identityOf(uniqueName);
+  const std::string key = identity.application
+                              ? identity.application->id + " " + std::string(evidenceText(identity.evidence))
+                              : "";
+  if (!parts_.rate.take(key)) throw sdbus::Error(kLimitsExceeded, "The client calls too often");
+}
+
 void AccountsService::checkSizes(const RVDictionary& options) const {
   const auto& settings = parts_.settings;
   const auto checkName = [&](const RVValue& value) {
@@ -137,6 +146,7 @@ void AccountsService::requestAccess(const std::shared_ptr<Call>& call) {
       call->message(), limit, {RVFacebookAppIdKey, RVFacebookPermissionsKey, RVFacebookAudienceKey}));
   const bool allowUserInteraction = readBoolean(call->message(), limit);
   checkSizes(*options);
+  checkRate(call->sender());
   auto& plugin = pluginForAccountType(parts_, accountType);
   const auto client = clientOfConnection(parts_, call->sender());
   const auto id = client->bundleID();
@@ -185,6 +195,7 @@ void AccountsService::getCredential(const std::shared_ptr<Call>& call) {
   pluginForAccountType(parts_, accountType);
   const auto client = parts_.identities.identityOf(call->sender()).application;
   if (!client) throw sdbus::Error(kNoAccess, "The caller holds no access");
+  checkRate(call->sender());
   dispatcher_.onPool(call, [this, call, accountType, id = client->id] {
     const auto accounts = parts_.accounts.listOfType(accountType);
     const auto record = parts_.records.find(accountType, id);

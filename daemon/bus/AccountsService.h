@@ -24,6 +24,7 @@ class AccountsService {
   void requestAccess(const std::shared_ptr<Call>& call);
   void getAccess(const std::shared_ptr<Call>& call);
   void getCredential(const std::shared_ptr<Call>& call);
+  void checkRate(const std::string& uniqueName) const;
   void checkSizes(const RVDictionary& options) const;
 
   sdbus::IObject& object_;

@@ -18,6 +18,7 @@
 #include "daemon/records/AuthorizationRecords.h"
 #include "daemon/records/Intents.h"
 #include "daemon/records/RequestStore.h"
+#include "daemon/requests/RateLimit.h"
 #include "daemon/requests/RequestPool.h"
 #include "daemon/requests/RequestTable.h"
 #include "daemon/requests/WaitingLimits.h"
@@ -41,6 +42,7 @@ struct Parts {
   const std::vector<std::unique_ptr<plugins::PluginModule>>& plugins;
   requests::RequestPool& pool;
   requests::RequestTable& requests;
+  requests::RateLimit& rate;
   std::shared_ptr<requests::WaitingLimiter> limits;
   std::shared_ptr<requests::WaitingLimiter> noLimits;
 };

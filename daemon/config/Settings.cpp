@@ -77,6 +77,7 @@ std::vector<Key> knownKeys(const URLCheck& checkURL) {
       {"Credentials", "Store", readStore},
       limit("WaitingRequestsPerClient", 1, 4096, &Settings::waitingRequestsPerClient),
       limit("WaitingRequests", 1, 4096, &Settings::waitingRequests),
+      limit("CallsPerSecond", 1, 1'000'000, &Settings::callsPerSecond),
       // The bus itself carries no message of more than 128 MiB.
       limit("MessageBytes", 1024, std::size_t{128} * 1024 * 1024, &Settings::messageBytes),
       limit("PermissionsPerRequest", 1, 65536, &Settings::permissionsPerRequest),

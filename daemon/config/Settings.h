@@ -26,6 +26,7 @@ struct Settings {
   // [Limits]
   std::size_t waitingRequestsPerClient = 8;  // WaitingRequestsPerClient, 1 to 4096
   std::size_t waitingRequests = 1024;        // WaitingRequests, 1 to 4096
+  std::size_t callsPerSecond = 200;          // CallsPerSecond of one client, 1 to 1000000
   std::size_t messageBytes = 1024 * 1024;    // MessageBytes, 1024 to 128 MiB
   std::size_t permissionsPerRequest = 256;   // PermissionsPerRequest, 1 to 65536
   std::size_t nameBytes = 256;               // NameBytes, 1 to 65536

@@ -1,7 +1,9 @@
 """Requests that wait at the same time: whose turn it is, and what an answer settles for the others."""
 
+from gi.repository import GLib
+
 from harness.agent import ALLOW
-from harness.expect import GRANTED, REFUSED_WITHOUT_ERROR, USER_REFUSED
+from harness.expect import GRANTED, LIMITS_EXCEEDED, REFUSED_WITHOUT_ERROR, USER_REFUSED
 
 
 def test_what_an_answer_has_settled_is_not_asked_again(world):
@@ -72,3 +74,26 @@ def test_a_client_with_many_requests_delays_another_by_no_more_than_one(world):
     assert all(one.answer() == GRANTED for one in pending)
     # It may have come a moment after the first answer.
     assert order.index("org.example.Patient") <= 2, order
+
+
+def test_a_client_that_asks_too_often_is_turned_away_and_another_is_not(bare_world, standin):
+    bare_world.start_bus()
+    bare_world.configure(standin.url, limits={"CallsPerSecond": 1})
+    bare_world.start_daemon()
+    manager = bare_world.manager()
+    manager.add_account()
+    agent = bare_world.agent(answer=ALLOW)
+    eager = bare_world.application("org.example.Eager", "Eager")
+    other = bare_world.application("org.example.Other", "Other")
+    asked = [eager.start_request([name]) for name in ("email", "user_photos", "user_likes", "user_videos")]
+    assert asked[0].answer() == GRANTED
+    turned_away = 0
+    for pending in asked[1:]:
+        try:
+            pending.answer()
+        except GLib.Error as error:
+            assert LIMITS_EXCEEDED in error.message
+            turned_away += 1
+    assert turned_away >= 1
+    assert other.request(["email"]) == GRANTED
+    assert agent.asked() == len(manager.access_log()) == 2 + len(asked) - 1 - turned_away

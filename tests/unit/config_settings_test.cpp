@@ -38,6 +38,7 @@ TEST_F(TheSettings, OfAnEmptyFileAreTheDefaults) {
   EXPECT_EQ(settings->credentialStore, CredentialStore::kSealed);
   EXPECT_EQ(settings->waitingRequestsPerClient, 8u);
   EXPECT_EQ(settings->waitingRequests, 1024u);
+  EXPECT_EQ(settings->callsPerSecond, 200u);
   EXPECT_EQ(settings->messageBytes, 1048576u);
   EXPECT_EQ(settings->permissionsPerRequest, 256u);
   EXPECT_EQ(settings->nameBytes, 256u);
@@ -47,7 +48,7 @@ TEST_F(TheSettings, AreWhatTheFileSays) {
   const auto settings = read(
       "[Server]\nURL=https://facebook.example\nTimeoutSeconds=5\nCAFile=/etc/ca.crt\n"
       "[Credentials]\nStore=secret-service\n"
-      "[Limits]\nWaitingRequestsPerClient=1\nWaitingRequests=2\nMessageBytes=4096\n"
+      "[Limits]\nWaitingRequestsPerClient=1\nWaitingRequests=2\nCallsPerSecond=3\nMessageBytes=4096\n"
       "PermissionsPerRequest=4\nNameBytes=5\n");
   ASSERT_TRUE(settings) << settings.failure().message;
   EXPECT_EQ(settings->serverURL, "https://facebook.example");
@@ -56,6 +57,7 @@ TEST_F(TheSettings, AreWhatTheFileSays) {
   EXPECT_EQ(settings->credentialStore, CredentialStore::kSecretService);
   EXPECT_EQ(settings->waitingRequestsPerClient, 1u);
   EXPECT_EQ(settings->waitingRequests, 2u);
+  EXPECT_EQ(settings->callsPerSecond, 3u);
   EXPECT_EQ(settings->messageBytes, 4096u);
   EXPECT_EQ(settings->permissionsPerRequest, 4u);
   EXPECT_EQ(settings->nameBytes, 5u);
