@@ -40,8 +40,10 @@ ExitStatus listAuthorizations(Session& session) {
                     record.value("granted", false) ? "granted" : "refused",
                     joined(record.value("permissions", Json::array())),
                     optionsText(record.value("options", Json::object())),
+                    record.value("evidence", "-"),
                     timeText(record.value("changed", 0LL))});
-  session.output.print(tableOf({"CLIENT", "NAME", "ACCESS", "PERMISSIONS", "OPTIONS", "CHANGED"}, rows));
+  session.output.print(
+      tableOf({"CLIENT", "NAME", "ACCESS", "PERMISSIONS", "OPTIONS", "EVIDENCE", "CHANGED"}, rows));
   return ExitStatus::kDone;
 }
 

@@ -22,8 +22,9 @@ ExitStatus showAccessLog(Session& session, std::uint32_t limit) {
                     entry.value("granted", false) ? "granted" : "not granted",
                     entry.value("requested", false) ? "request" : "direct",
                     entry.value("client_id", "-"),
+                    entry.value("evidence", "-"),
                     entry.value("account_type", "")});
-  session.output.print(tableOf({"TIME", "RESULT", "HOW", "CLIENT", "ACCOUNT TYPE"}, rows));
+  session.output.print(tableOf({"TIME", "RESULT", "HOW", "CLIENT", "EVIDENCE", "ACCOUNT TYPE"}, rows));
   return ExitStatus::kDone;
 }
 

@@ -148,7 +148,7 @@ void AccountsService::requestAccess(const std::shared_ptr<Call>& call) {
   checkSizes(*options);
   checkRate(call->sender());
   auto& plugin = pluginForAccountType(parts_, accountType);
-  const auto client = clientOfConnection(parts_, call->sender());
+  const auto client = clientOfConnection(parts_, call->sender(), accountType);
   const auto id = client->bundleID();
 
   auto work = [this,
@@ -180,8 +180,8 @@ void AccountsService::getAccess(const std::shared_ptr<Call>& call) {
   SizeLimit limit{parts_.settings.messageBytes};
   const std::string accountType = readString(call->message(), limit);
   pluginForAccountType(parts_, accountType);
-  const auto id = parts_.identities.identityOf(call->sender()).application;
-  const auto record = id ? parts_.records.find(accountType, id->id) : std::nullopt;
+  const auto application = identityOfConnection(parts_, call->sender(), accountType).application;
+  const auto record = application ? parts_.records.find(accountType, application->id) : std::nullopt;
   call->reply([&](sdbus::MethodReply& reply) {
     reply << (!record ? "none" : record->granted ? "granted" : "refused");
     writeNames(reply, record ? record->permissions.value_or(RVPermissionSet()) : RVPermissionSet());
@@ -193,18 +193,24 @@ void AccountsService::getCredential(const std::shared_ptr<Call>& call) {
   SizeLimit limit{parts_.settings.messageBytes};
   const std::string accountType = readString(call->message(), limit);
   pluginForAccountType(parts_, accountType);
-  const auto client = parts_.identities.identityOf(call->sender()).application;
-  if (!client) throw sdbus::Error(kNoAccess, "The caller holds no access");
+  const auto identity = identityOfConnection(parts_, call->sender(), accountType);
+  if (!identity.application) throw sdbus::Error(kNoAccess, "The caller holds no access");
   checkRate(call->sender());
-  dispatcher_.onPool(call, [this, call, accountType, id = client->id] {
-    const auto accounts = parts_.accounts.listOfType(accountType);
-    const auto record = parts_.records.find(accountType, id);
-    const auto credential = accounts.empty() || !record || !record->granted
-                                ? nullptr
-                                : parts_.keychain.credentialForClient(accounts.front().identifier, id);
-    if (credential == nullptr) throw sdbus::Error(kNoAccess, "The caller holds no access");
-    call->reply([&](sdbus::MethodReply& reply) { writeCredential(reply, *credential); });
-  });
+  dispatcher_.onPool(
+      call, [this, call, accountType, id = identity.application->id, evidence = identity.evidence] {
+        const auto holdsAccess = [&] {
+          const auto record = parts_.records.find(accountType, id);
+          return record && record->granted && record->evidence <= evidence;
+        };
+        const auto accounts = parts_.accounts.listOfType(accountType);
+        const auto credential = accounts.empty() || !holdsAccess()
+                                    ? nullptr
+                                    : parts_.keychain.credentialForClient(accounts.front().identifier, id);
+        // Asked again: while the credential was read, it may have become somebody else's.
+        if (credential == nullptr || !holdsAccess())
+          throw sdbus::Error(kNoAccess, "The caller holds no access");
+        call->reply([&](sdbus::MethodReply& reply) { writeCredential(reply, *credential); });
+      });
 }
 
 void AccountsService::accessChanged(const std::string& accountType,

@@ -79,6 +79,7 @@ void ManagementService::listAuthorizations(SharedCall call) {
                            {"name", parts_.clients.clientForID(record.clientId)->localizedAppName()},
                            {"granted", record.granted},
                            {"options", record.options.value_or(RVDictionary())},
+                           {"evidence", clients::evidenceText(record.evidence)},
                            {"changed", std::int64_t{record.changed.time_since_epoch().count()}}};
         reply.openContainer("{sv}");
         for (const auto& [key, value] : entry) {
@@ -232,7 +233,8 @@ void ManagementService::listAccessLog(SharedCall call) {
         RVDictionary fields{{"time", std::int64_t{entry.time.time_since_epoch().count()}},
                             {"account_type", entry.accountType},
                             {"granted", entry.granted},
-                            {"requested", entry.requested}};
+                            {"requested", entry.requested},
+                            {"evidence", clients::evidenceText(entry.evidence)}};
         if (entry.clientId) fields.emplace("client_id", *entry.clientId);
         writeDictionary(reply, fields);
       }

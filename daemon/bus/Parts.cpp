@@ -20,8 +20,20 @@ std::shared_ptr<RVDAccountStore> makeStore(const Parts& parts) {
       parts.records, parts.accounts, requests::RequestContext::current(), clientForID, parts.log);
 }
 
-std::shared_ptr<const clients::Client> clientOfConnection(const Parts& parts, const std::string& uniqueName) {
-  const auto identity = parts.identities.identityOf(uniqueName);
+clients::Identities::Identity identityOfConnection(const Parts& parts,
+                                                   const std::string& uniqueName,
+                                                   const std::string& accountType) {
+  auto identity = parts.identities.identityOf(uniqueName);
+  const bool isKnown = identity.application && identity.evidence != clients::Evidence::kUnknown;
+  if (!isKnown || parts.records.isStronger(accountType, identity.application->id, identity.evidence))
+    return {};
+  return identity;
+}
+
+std::shared_ptr<const clients::Client> clientOfConnection(const Parts& parts,
+                                                          const std::string& uniqueName,
+                                                          const std::string& accountType) {
+  const auto identity = identityOfConnection(parts, uniqueName, accountType);
   if (!identity.application) return parts.clients.unknownClient();
   return parts.clients.clientForIdentity(*identity.application, identity.evidence);
 }

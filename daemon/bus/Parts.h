@@ -53,8 +53,16 @@ RVDAccountAccessPlugin& pluginForAccountType(const Parts& parts, const std::stri
 // What a plug-in is given for one call; it belongs to the calling thread's current request, if any.
 std::shared_ptr<RVDAccountStore> makeStore(const Parts& parts);
 
-// The client that a connection is at this moment.
-std::shared_ptr<const clients::Client> clientOfConnection(const Parts& parts, const std::string& uniqueName);
+// Who a connection is at this moment, for the account type. Nobody (no application, evidence unknown) where
+// the record of that client was made with stronger evidence than there is for the connection.
+clients::Identities::Identity identityOfConnection(const Parts& parts,
+                                                   const std::string& uniqueName,
+                                                   const std::string& accountType);
+
+// The client that a connection is at this moment, for the account type.
+std::shared_ptr<const clients::Client> clientOfConnection(const Parts& parts,
+                                                          const std::string& uniqueName,
+                                                          const std::string& accountType);
 
 // Tells the client of this ID apart from all others, those without an ID included.
 std::string clientKeyOfID(std::string_view id);

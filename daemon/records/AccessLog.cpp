@@ -18,16 +18,19 @@ void AccessLog::RVDLogAccessRequest(std::string_view accountTypeIdentifier,
                                     bool granted,
                                     bool requested,
                                     double /*elapsed*/) {
+  const auto request = requests::RequestContext::current();
+  const auto evidence = request != nullptr ? request->evidence() : clients::Evidence::kUnknown;
   const auto write = [&] {
     const auto done = database_.write([&](Connection& connection) -> base::Result<void> {
       auto added = connection.run(
-          "INSERT INTO access_log (time, account_type, client_id, granted, requested) "
-          "VALUES (?1, ?2, ?3, ?4, ?5)",
+          "INSERT INTO access_log (time, account_type, client_id, granted, requested, evidence) "
+          "VALUES (?1, ?2, ?3, ?4, ?5, ?6)",
           std::int64_t{clock_().time_since_epoch().count()},
           accountTypeIdentifier,
           clientID,
           std::int64_t{granted},
-          std::int64_t{requested});
+          std::int64_t{requested},
+          static_cast<std::int64_t>(evidence));
       if (!added) return added;
       return connection.run(
           "DELETE FROM access_log WHERE number <= (SELECT max(number) FROM access_log) - ?1",
@@ -36,7 +39,6 @@ void AccessLog::RVDLogAccessRequest(std::string_view accountTypeIdentifier,
     if (!done)
       logging::error(log_, "An access decision could not be logged: %@", {RVValue(done.failure().message)});
   };
-  const auto request = requests::RequestContext::current();
   if (request == nullptr) {
     write();
   } else {
@@ -48,7 +50,7 @@ base::Result<std::vector<AccessLogEntry>> AccessLog::newest(std::uint32_t limit)
   std::vector<AccessLogEntry> entries;
   const auto done = database_.read([&](Connection& connection) -> base::Result<void> {
     auto statement = connection.prepare(
-        "SELECT time, account_type, client_id, granted, requested "
+        "SELECT time, account_type, client_id, granted, requested, evidence "
         "FROM access_log ORDER BY number DESC LIMIT ?1");
     if (!statement) return statement.failure();
     (*statement)->bind(std::int64_t{limit});
@@ -60,7 +62,8 @@ base::Result<std::vector<AccessLogEntry>> AccessLog::newest(std::uint32_t limit)
                          (*statement)->text(1),
                          (*statement)->optionalText(2),
                          (*statement)->number(3) != 0,
-                         (*statement)->number(4) != 0});
+                         (*statement)->number(4) != 0,
+                         static_cast<clients::Evidence>((*statement)->number(5))});
     }
   });
   if (!done) return done.failure();

@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "base/Result.h"
+#include "daemon/clients/Evidence.h"
 #include "daemon/records/Database.h"
 #include "daemon/state/Clock.h"
 #include "host/RVLog.h"
@@ -21,12 +22,14 @@ struct AccessLogEntry {
   std::optional<std::string> clientId;
   bool granted = false;
   bool requested = false;
+  clients::Evidence evidence = clients::Evidence::kUnknown;
 };
 
 // How many entries are kept; the oldest go first.
 inline constexpr std::int64_t kAccessLogEntries = 10'000;
 
-// Leaves out the decisions of a request that is void: the calling thread's current one. Thread-safe.
+// Keeps with each decision how the client was known in the calling thread's current request; unknown where it
+// works for none, as the user does. Leaves out the decisions of a request that is void. Thread-safe.
 class AccessLog : public RVDAccessLog {
  public:
   // The database and the log outlive the object.

@@ -112,11 +112,36 @@ std::vector<AuthorizationRecord> AuthorizationRecords::list(std::string_view acc
   return all;
 }
 
+bool AuthorizationRecords::isStronger(std::string_view accountType,
+                                      std::string_view clientId,
+                                      clients::Evidence evidence) const {
+  const auto record = find(accountType, clientId);
+  return record && record->evidence > evidence;
+}
+
 base::Result<void> AuthorizationRecords::put(AuthorizationRecord record) {
+  return replace(std::move(record), false);
+}
+
+base::Result<void> AuthorizationRecords::putForUser(AuthorizationRecord record) {
+  return replace(std::move(record), true);
+}
+
+base::Result<void> AuthorizationRecords::replace(AuthorizationRecord record, bool isForUser) {
   record.changed = clock_();
   return write(
       record.accountType,
-      [&](Connection& connection) { return writeAuthorization(connection, record); },
+      [&](Connection& connection) -> base::Result<void> {
+        // Asked while other writes wait, so that no stronger record comes in between.
+        if (isForUser) {
+          const auto earlier = find(record.accountType, record.clientId);
+          record.evidence = earlier ? earlier->evidence : clients::Evidence::kUnknown;
+        } else if (isStronger(record.accountType, record.clientId, record.evidence)) {
+          return base::Failure{base::FailureKind::kRefused,
+                               "the client's record was made with stronger evidence"};
+        }
+        return writeAuthorization(connection, record);
+      },
       [&](OfType& ofType) { ofType.insert_or_assign(record.clientId, record); });
 }
 

@@ -37,8 +37,17 @@ class AuthorizationRecords {
   // In byte order of the client IDs.
   std::vector<AuthorizationRecord> list(std::string_view accountType) const;
 
-  // Stores the record in place of the client's earlier one, with the current time as its `changed`.
+  // Whether there is a record of the client that was made with stronger evidence than this. A caller of this
+  // evidence is then not the client that the record is about.
+  bool isStronger(std::string_view accountType, std::string_view clientId, clients::Evidence evidence) const;
+
+  // Stores what a caller brought about in place of the client's earlier record, with the current time as its
+  // `changed`. kRefused, and the earlier record stays, where that was made with stronger evidence.
   base::Result<void> put(AuthorizationRecord record);
+
+  // The same for what the user did without a caller: the earlier record's evidence stays, and a first record
+  // has none.
+  base::Result<void> putForUser(AuthorizationRecord record);
 
   base::Result<void> removeAll(const std::string& accountType);
 
@@ -51,6 +60,7 @@ class AuthorizationRecords {
   AuthorizationRecords(Database& database, RVLogService& log, state::Clock clock);
   base::Result<void> reload();
   base::Result<void> removeUnreadable();
+  base::Result<void> replace(AuthorizationRecord record, bool isForUser);
   // Runs the work and, where it succeeded, lets memory follow.
   base::Result<void> write(const std::string& accountType,
                            const Database::Work& work,

@@ -27,7 +27,7 @@ base::Result<void> complete(const Intent& intent, AuthorizationRecords& records,
       if (!record) return {};
       record->granted = false;
       record->permissions.reset();
-      return records.put(*std::move(record));
+      return records.putForUser(*std::move(record));
     }
     case Intent::Kind::kRevokeAll:
       return records.removeAll(intent.accountType);

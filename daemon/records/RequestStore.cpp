@@ -28,6 +28,10 @@ std::vector<std::shared_ptr<RVAccount>> RequestStore::accountsWithAccountTypeIde
   return found;
 }
 
+clients::Evidence RequestStore::evidence() const {
+  return request_ != nullptr ? request_->evidence() : clients::Evidence::kUnknown;
+}
+
 RVDClientAuthorization RequestStore::authorizationFromRecord(const AuthorizationRecord& record) const {
   RVDClientAuthorization authorization(clients_(record.clientId));
   authorization.setIsGranted(record.granted);
@@ -42,6 +46,11 @@ std::optional<RVDClientAuthorization> RequestStore::authorizationForClient(const
   if (!clientId) return std::nullopt;
   const auto record = records_.find(accountType.identifier(), *clientId);
   if (!record) return std::nullopt;
+  // One that came up since the request began, or the caller would have been told apart from its client.
+  if (evidence() != clients::Evidence::kUnknown && record->evidence > evidence()) {
+    request_->makeVoid(requests::VoidReason::kWeakerEvidence);
+    return std::nullopt;
+  }
   return authorizationFromRecord(*record);
 }
 
@@ -66,18 +75,26 @@ std::optional<RVError> RequestStore::setAuthorization(const RVDClientAuthorizati
   const auto clientId = client.bundleID();
   if (!clientId)
     return storageError("nothing is stored for a client without an ID", kRVErrorClientWithoutBundleID);
+  bool isWeaker = false;
   const auto done = unlessVoid([&] {
-    return records_.put({accountType.identifier(),
-                         *clientId,
-                         authorization.isGranted(),
-                         authorization.grantedPermissions(),
-                         authorization.options(),
-                         {}});
+    AuthorizationRecord record{accountType.identifier(),
+                               *clientId,
+                               authorization.isGranted(),
+                               authorization.grantedPermissions(),
+                               authorization.options(),
+                               {},
+                               evidence()};
+    // A caller that has an ID is known somehow.
+    if (evidence() == clients::Evidence::kUnknown) return records_.putForUser(std::move(record));
+    auto put = records_.put(std::move(record));
+    isWeaker = !put && put.failure().kind == base::FailureKind::kRefused;
+    return put;
   });
   if (done) {
     if (request_ != nullptr) request_->decisionStored();
     return std::nullopt;
   }
+  if (isWeaker) request_->makeVoid(requests::VoidReason::kWeakerEvidence);
   logging::error(
       log_, "The record of %@ is not stored: %@", {RVValue(*clientId), RVValue(done.failure().message)});
   return storageError(done.failure().message);

@@ -20,7 +20,8 @@ namespace records {
 using ClientLookup = std::function<std::shared_ptr<const RVDClient>(const std::string& clientId)>;
 
 // What a plug-in is given for one request. Nothing that it writes once the request is void is stored; it
-// gets an error back. The records and accounts outlive the store.
+// gets an error back. A request that meets a record which was made with stronger evidence than its own
+// becomes void. The records and accounts outlive the store.
 class RequestStore : public RVDAccountStore, private RVDAuthorizationManager {
  public:
   // request: may be null (a call that no request stands behind).
@@ -44,6 +45,8 @@ class RequestStore : public RVDAccountStore, private RVDAuthorizationManager {
                                           const RVAccountType& accountType) override;
   void removeAllClientAuthorizationsForAccountType(const RVAccountType& accountType) override;
 
+  // How the caller is known; unknown where it is the user who acts, without a caller.
+  clients::Evidence evidence() const;
   RVDClientAuthorization authorizationFromRecord(const AuthorizationRecord& record) const;
   base::Result<void> unlessVoid(const std::function<base::Result<void>()>& write);
 

@@ -21,7 +21,8 @@ enum class VoidReason {
   kClientRevoked,
   kStopping,
   kLimitReached,
-  kOutdated,  // another request of the client was decided meanwhile; it is begun anew
+  kOutdated,        // another request of the client was decided meanwhile; it is begun anew
+  kWeakerEvidence,  // a record of its client was made with stronger evidence than the request has
 };
 
 // Counts the requests that wait, for each client and in all. Implemented by the request table.
@@ -55,7 +56,8 @@ class RequestContext {
   // What an alert tells about the client besides the plug-in's words, by the keys of Agent1's description.
   const RVDictionary& clientDetails() const { return details_; }
 
-  // How it was known, when the request came, which application its client is.
+  // How it was known, when the request came, which application its client is. Unknown where its client has no
+  // ID, and for what the user has the daemon do.
   clients::Evidence evidence() const { return evidence_; }
 
   bool isVoid() const { return voidReason().has_value(); }

@@ -400,6 +400,7 @@ RECORDS = dictionaries(
         "permissions": GLib.Variant("as", ["email", "user_likes"]),
         "options": GLib.Variant("a{sv}", {"app_id": text("4711")}),
         "changed": GLib.Variant("x", 1714566600),
+        "evidence": text("registered"),
     },
     {
         "client_id": text("org.example.Game"),
@@ -407,6 +408,7 @@ RECORDS = dictionaries(
         "granted": GLib.Variant("b", False),
         "options": GLib.Variant("a{sv}", {}),
         "changed": GLib.Variant("x", 0),
+        "evidence": text("unknown"),
     },
 )
 
@@ -417,9 +419,9 @@ def test_authorizations_are_listed(tools, rvd):
     outcome = tools.run("list")
     assert outcome.status == DONE
     assert outcome.out == (
-        "CLIENT                NAME       ACCESS   PERMISSIONS        OPTIONS      CHANGED\n"
-        "org.example.PhotoApp  Photo App  granted  email, user_likes  app_id=4711  2024-05-01 12:30:00\n"
-        "org.example.Game      写真       refused  -                  -            1970-01-01 00:00:00\n"
+        "CLIENT                NAME       ACCESS   PERMISSIONS        OPTIONS      EVIDENCE    CHANGED\n"
+        "org.example.PhotoApp  Photo App  granted  email, user_likes  app_id=4711  registered  2024-05-01 12:30:00\n"
+        "org.example.Game      写真       refused  -                  -            unknown     1970-01-01 00:00:00\n"
     )
     status, document = tools.json("list")
     assert status == DONE
@@ -473,12 +475,14 @@ ENTRIES = dictionaries(
         "client_id": text("org.example.PhotoApp"),
         "granted": GLib.Variant("b", True),
         "requested": GLib.Variant("b", True),
+        "evidence": text("sandbox"),
     },
     {
         "time": GLib.Variant("x", 0),
         "account_type": text(FACEBOOK),
         "granted": GLib.Variant("b", False),
         "requested": GLib.Variant("b", False),
+        "evidence": text("unknown"),
     },
 )
 
@@ -489,9 +493,9 @@ def test_the_access_log_is_shown(tools, rvd):
     outcome = tools.run("log")
     assert outcome.status == DONE
     assert outcome.out == (
-        "TIME                 RESULT       HOW      CLIENT                ACCOUNT TYPE\n"
-        "2024-05-01 12:30:00  granted      request  org.example.PhotoApp  com.zentor.facebook\n"
-        "1970-01-01 00:00:00  not granted  direct   -                     com.zentor.facebook\n"
+        "TIME                 RESULT       HOW      CLIENT                EVIDENCE  ACCOUNT TYPE\n"
+        "2024-05-01 12:30:00  granted      request  org.example.PhotoApp  sandbox   com.zentor.facebook\n"
+        "1970-01-01 00:00:00  not granted  direct   -                     unknown   com.zentor.facebook\n"
     )
     status, document = tools.json("log", "--limit", "7")
     assert (status, document["entries"]) == (DONE, ENTRIES.unpack()[0])

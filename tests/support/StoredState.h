@@ -75,8 +75,10 @@ class StoredState {
         .at(0);
   }
 
+  // A record that the user made.
   void put(const std::string& clientId, bool granted) {
-    succeed(records->put({std::string(RVAccountTypeIdentifierFacebook), clientId, granted, {}, {}, {}}));
+    succeed(
+        records->putForUser({std::string(RVAccountTypeIdentifierFacebook), clientId, granted, {}, {}, {}}));
   }
 
   std::optional<RVError> storeCredential(const std::string& clientId,
@@ -106,8 +108,10 @@ class StoredState {
   std::unique_ptr<credentials::Keychain> keychain;
 };
 
-inline std::shared_ptr<requests::RequestContext> newRequest() {
-  return std::make_shared<requests::RequestContext>("org.example.PhotoApp", nullptr);
+inline std::shared_ptr<requests::RequestContext> newRequest(
+    clients::Evidence evidence = clients::Evidence::kUnknown) {
+  return std::make_shared<requests::RequestContext>(
+      "org.example.PhotoApp", nullptr, RVDictionary(), evidence);
 }
 
 }  // namespace support

@@ -99,6 +99,44 @@ TEST_F(StoredRecords, TellWhoListensAfterEachWriteThatWorked) {
   EXPECT_THAT(heard, ElementsAre(kType + " 1", kType + " 0", "other 0"));
 }
 
+TEST_F(StoredRecords, AreNotReplacedByACallerOfWeakerEvidence) {
+  using clients::Evidence;
+  const auto put = [&](bool granted, Evidence evidence) {
+    return state_->records->put({kType, "app", granted, {}, {}, {}, evidence});
+  };
+  succeed(put(true, Evidence::kRegistered));
+  EXPECT_FALSE(state_->records->isStronger(kType, "app", Evidence::kRegistered));
+  EXPECT_TRUE(state_->records->isStronger(kType, "app", Evidence::kUnknown));
+  EXPECT_FALSE(state_->records->isStronger(kType, "another", Evidence::kUnknown));
+  EXPECT_FALSE(state_->records->isStronger("other", "app", Evidence::kUnknown));
+  succeed(put(true, Evidence::kSandbox));
+  for (const Evidence weaker : {Evidence::kScope, Evidence::kRegistered, Evidence::kUnknown}) {
+    const auto refused = put(false, weaker);
+    ASSERT_FALSE(refused);
+    EXPECT_EQ(refused.failure().kind, base::FailureKind::kRefused);
+  }
+  for (int round = 0; round < 2; ++round) {
+    EXPECT_TRUE(state_->records->find(kType, "app")->granted);
+    EXPECT_EQ(state_->records->find(kType, "app")->evidence, Evidence::kSandbox);
+    reopen();
+  }
+  succeed(put(false, Evidence::kSandbox));
+  EXPECT_FALSE(state_->records->find(kType, "app")->granted);
+}
+
+TEST_F(StoredRecords, KeepTheirEvidenceWhereTheUserChangesThem) {
+  using clients::Evidence;
+  succeed(state_->records->put({kType, "app", true, {}, {}, {}, Evidence::kScope}));
+  succeed(state_->records->putForUser({kType, "app", false, {}, {}, {}, Evidence::kUnknown}));
+  succeed(state_->records->putForUser({kType, "new", true, {}, {}, {}, Evidence::kSandbox}));
+  for (int round = 0; round < 2; ++round) {
+    EXPECT_FALSE(state_->records->find(kType, "app")->granted);
+    EXPECT_EQ(state_->records->find(kType, "app")->evidence, Evidence::kScope);
+    EXPECT_EQ(state_->records->find(kType, "new")->evidence, Evidence::kUnknown);
+    reopen();
+  }
+}
+
 TEST_F(StoredRecords, LetARefusalBeForgottenAndAGrantNot) {
   state_->put("refused", false);
   state_->put("granted", true);
@@ -305,6 +343,20 @@ TEST_F(TheStoredAccessLog, ShowsTheNewestFirstUpToTheLimit) {
   EXPECT_EQ(valueOf(state_->accessLog.newest(0xffffffff)).size(), 5U);
 }
 
+TEST_F(TheStoredAccessLog, KeepsHowTheClientWasKnown) {
+  const auto log = [&] { state_->accessLog.RVDLogAccessRequest(kType, "app", true, true, 0); };
+  log();
+  for (const auto evidence : {clients::Evidence::kRegistered, clients::Evidence::kSandbox}) {
+    const requests::RequestContext::Scope scope(support::newRequest(evidence));
+    log();
+  }
+  reopen();
+  const auto entries = valueOf(state_->accessLog.newest(3));
+  EXPECT_EQ(entries[0].evidence, clients::Evidence::kSandbox);
+  EXPECT_EQ(entries[1].evidence, clients::Evidence::kRegistered);
+  EXPECT_EQ(entries[2].evidence, clients::Evidence::kUnknown);
+}
+
 TEST_F(TheStoredAccessLog, KeepsNoMoreThanItsLimit) {
   succeed(state_->database->write([](records::Connection& connection) {
     return connection.run(
@@ -352,8 +404,13 @@ TEST_F(InterruptedWork, ThatWasFinishedIsNotDoneAgain) {
 }
 
 TEST_F(InterruptedWork, RevokesTheClientAndLeavesTheOthersAlone) {
-  succeed(state_->records->put(
-      {kType, "one", true, RVPermissionSet{"email"}, RVDictionary{{"app_id", "1"}}, {}}));
+  succeed(state_->records->put({kType,
+                                "one",
+                                true,
+                                RVPermissionSet{"email"},
+                                RVDictionary{{"app_id", "1"}},
+                                {},
+                                clients::Evidence::kSandbox}));
   valueOf(state_->intents.begin({records::Intent::Kind::kRevokeClient, kType, "one"}));
   restart();
   const auto record = state_->records->find(kType, "one");
@@ -361,6 +418,7 @@ TEST_F(InterruptedWork, RevokesTheClientAndLeavesTheOthersAlone) {
   EXPECT_FALSE(record->granted);
   EXPECT_FALSE(record->permissions);
   EXPECT_TRUE(record->options == RVDictionary({{"app_id", "1"}}));
+  EXPECT_EQ(record->evidence, clients::Evidence::kSandbox);
   EXPECT_FALSE(holdsCredential("one"));
   EXPECT_TRUE(holdsCredential("two"));
   EXPECT_THAT(state_->log.texts(), Contains(HasSubstr("access of one to " + kType + " was interrupted")));

@@ -7,6 +7,7 @@
 
 namespace {
 
+using clients::Evidence;
 using requests::RequestContext;
 using requests::VoidReason;
 using support::valueOf;
@@ -160,6 +161,77 @@ TEST_F(AVoidRequest, ChangesNothingOnceMakeVoidHasReturned) {
     EXPECT_EQ(token(), stored);
     EXPECT_EQ(valueOf(state_.accessLog.newest(100'000)).size(), logged);
   }
+}
+
+// A request whose caller is known with some evidence, and records that others made.
+class ARequestWithEvidence : public AVoidRequest {
+ protected:
+  void setEvidence(Evidence evidence) {
+    request_ = support::newRequest(evidence);
+    store_ = state_.storeFor(request_);
+    carrier_ = store_->accountsWithAccountTypeIdentifier(kType).at(0);
+    carrier_->setCredential(credential("token"));
+  }
+  void putWith(Evidence evidence) {
+    support::succeed(state_.records->put({kType, "app", true, {}, {}, {}, evidence}));
+  }
+  Evidence evidence() { return state_.records->find(kType, "app")->evidence; }
+};
+
+TEST_F(ARequestWithEvidence, LeavesItWithItsRecord) {
+  setEvidence(Evidence::kScope);
+  EXPECT_FALSE(put(true));
+  EXPECT_EQ(evidence(), Evidence::kScope);
+}
+
+TEST_F(ARequestWithEvidence, RaisesTheEvidenceOfAWeakerRecord) {
+  putWith(Evidence::kRegistered);
+  setEvidence(Evidence::kSandbox);
+  EXPECT_TRUE(store_->authorizationManager().authorizationForClient(*client_, kFacebook)->isGranted());
+  EXPECT_EQ(evidence(), Evidence::kRegistered);
+  EXPECT_FALSE(put(true));
+  EXPECT_EQ(evidence(), Evidence::kSandbox);
+}
+
+TEST_F(ARequestWithEvidence, UsesTheRecordThatTheUserMade) {
+  state_.put("app", true);
+  setEvidence(Evidence::kRegistered);
+  EXPECT_TRUE(store_->authorizationManager().authorizationForClient(*client_, kFacebook)->isGranted());
+  EXPECT_FALSE(request_->isVoid());
+}
+
+TEST_F(ARequestWithEvidence, IsVoidWhereItMeetsAStrongerRecord) {
+  putWith(Evidence::kSandbox);
+  setEvidence(Evidence::kScope);
+  EXPECT_FALSE(store_->authorizationManager().authorizationForClient(*client_, kFacebook));
+  EXPECT_EQ(request_->voidReason(), VoidReason::kWeakerEvidence);
+}
+
+TEST_F(ARequestWithEvidence, IsVoidWhereAStrongerRecordCameInBetween) {
+  setEvidence(Evidence::kRegistered);
+  EXPECT_FALSE(store_->authorizationManager().authorizationForClient(*client_, kFacebook));
+  putWith(Evidence::kScope);
+  EXPECT_TRUE(put(false));
+  EXPECT_EQ(request_->voidReason(), VoidReason::kWeakerEvidence);
+  EXPECT_TRUE(state_.records->find(kType, "app")->granted);
+  EXPECT_EQ(evidence(), Evidence::kScope);
+  EXPECT_TRUE(storeCredential());
+}
+
+TEST_F(ARequestWithEvidence, IsVoidForTheReasonThatItHad) {
+  setEvidence(Evidence::kRegistered);
+  request_->makeVoid(VoidReason::kOutdated);
+  EXPECT_TRUE(put(false));
+  EXPECT_EQ(request_->voidReason(), VoidReason::kOutdated);
+}
+
+TEST_F(ARequestWithEvidence, IsNoneOfTheUsersOwn) {
+  putWith(Evidence::kSandbox);
+  EXPECT_TRUE(store_->authorizationManager().authorizationForClient(*client_, kFacebook)->isGranted());
+  EXPECT_FALSE(put(false));
+  EXPECT_FALSE(request_->isVoid());
+  EXPECT_FALSE(state_.records->find(kType, "app")->granted);
+  EXPECT_EQ(evidence(), Evidence::kSandbox);
 }
 
 }  // namespace
