@@ -1,5 +1,7 @@
 #include "daemon/requests/RequestPool.h"
 
+#include <malloc.h>
+
 #include <algorithm>
 #include <system_error>
 #include <utility>
@@ -92,8 +94,14 @@ void RequestPool::run(Thread self) {
     work = nullptr;  // what it holds may take locks of its own when it goes
     lock.lock();
   }
+  // Those that ended before are joined here, and so keep nothing of what a burst of requests needed.
+  std::list<std::thread> endedBefore;
+  endedBefore.swap(ended_);
   ended_.splice(ended_.end(), threads_, self);
   threadEnded_.notify_all();
+  lock.unlock();
+  joinEnded(std::move(endedBefore));
+  ::malloc_trim(0);
 }
 
 void RequestPool::joinEnded(std::list<std::thread> ended) {
