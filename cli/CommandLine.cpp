@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "base/Text.h"
+#include "cli/Period.h"
 
 namespace cli {
 namespace {
@@ -32,6 +33,9 @@ struct CommandLine {
   Text permissions;
   Text audience;
   Text limit;
+  Text client;
+  Text since;
+  Text until;
   bool all = false;
   std::function<ExitStatus(Session&)> chosen;
 };
@@ -170,8 +174,22 @@ void addLogCommand(CommandLine& line) {
       addCommand(line, &line.app, "log", "Show what was asked for and decided", [&line](Session& session) {
         const auto limit = numberFrom<std::uint32_t>(line.limit.value_or("50"), "--limit takes a number");
         if (!limit) return session.output.failed(limit.failure());
-        return showAccessLog(session, *limit);
+        LogFilter filter{*limit, line.client, std::nullopt, std::nullopt};
+        if (line.since) {
+          const auto since = periodFrom(*line.since);
+          if (!since) return session.output.failed(since.failure());
+          filter.since = since->first;
+        }
+        if (line.until) {
+          const auto until = periodFrom(*line.until);
+          if (!until) return session.output.failed(until.failure());
+          filter.until = until->last;
+        }
+        return showAccessLog(session, filter);
       });
+  addText(command, "--client", line.client, "ID", "of this application alone");
+  addText(command, "--since", line.since, "TIME", "from this day or time on (2024-05-01T12:30)");
+  addText(command, "--until", line.until, "TIME", "up to this day or time, the whole of it");
   addText(command, "--limit", line.limit, "N", "how many entries, the newest first (50)");
 }
 

@@ -36,7 +36,14 @@ ExitStatus authorize(Session& session, const std::string& clientID);
 ExitStatus revoke(Session& session, const std::string& clientID);
 ExitStatus revokeAll(Session& session);
 ExitStatus forgetRefusal(Session& session, const std::string& clientID);
-ExitStatus showAccessLog(Session& session, std::uint32_t limit);
+// The newest entries of those that the filter lets through.
+struct LogFilter {
+  std::uint32_t limit = 0;
+  std::optional<std::string> client;
+  std::optional<long long> since;  // seconds since 1970, both included
+  std::optional<long long> until;
+};
+ExitStatus showAccessLog(Session& session, const LogFilter& filter);
 
 // preference. valueText: JSON, or a text that is no JSON as it is.
 ExitStatus getPreference(Session& session, const std::string& applicationID, const std::string& key);

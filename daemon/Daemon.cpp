@@ -216,7 +216,9 @@ base::Result<void> Daemon::openStorage(const Places& places) {
       !kept)
     return kept;
   storage.keychain = std::make_unique<credentials::Keychain>(database, *storage.credentialStore, log_);
-  storage.accessLog = std::make_unique<records::AccessLog>(database, log_, state::systemTime);
+  storage.accessLog = std::make_unique<records::AccessLog>(
+      database, log_, state::systemTime, std::chrono::days(settings_.accessLogDays));
+  if (auto pruned = storage.accessLog->prune(); !pruned) return pruned;
   storage.intents = std::make_unique<records::Intents>(database);
   storage.preferences = std::make_unique<preferences::PreferencesStore>(*storage.directory, log_);
   if (auto done = storage.intents->completeInterrupted(*storage.records, *storage.accounts, log_); !done)

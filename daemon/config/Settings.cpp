@@ -59,10 +59,18 @@ struct Key {
   std::function<Fault(const std::string& value, Settings& settings)> read;
 };
 
-Key limit(std::string_view name, std::size_t least, std::size_t most, std::size_t Settings::*number) {
-  return {"Limits", name, [least, most, number](const std::string& value, Settings& settings) {
+Key number(std::string_view section,
+           std::string_view name,
+           std::size_t least,
+           std::size_t most,
+           std::size_t Settings::*number) {
+  return {section, name, [least, most, number](const std::string& value, Settings& settings) {
             return readNumber(value, least, most, settings.*number);
           }};
+}
+
+Key limit(std::string_view name, std::size_t least, std::size_t most, std::size_t Settings::*limit) {
+  return number("Limits", name, least, most, limit);
 }
 
 std::vector<Key> knownKeys(const URLCheck& checkURL) {
@@ -75,6 +83,7 @@ std::vector<Key> knownKeys(const URLCheck& checkURL) {
       {"Server", "TimeoutSeconds", readTimeout},
       {"Server", "CAFile", readCAFile},
       {"Credentials", "Store", readStore},
+      number("AccessLog", "KeepDays", 1, 36500, &Settings::accessLogDays),
       limit("WaitingRequestsPerClient", 1, 4096, &Settings::waitingRequestsPerClient),
       limit("WaitingRequests", 1, 4096, &Settings::waitingRequests),
       limit("CallsPerSecond", 1, 1'000'000, &Settings::callsPerSecond),

@@ -23,6 +23,9 @@ struct Settings {
   // [Credentials]
   CredentialStore credentialStore = CredentialStore::kSealed;  // Store, "sealed" or "secret-service"
 
+  // [AccessLog]
+  std::size_t accessLogDays = 365;  // KeepDays, 1 to 36500
+
   // [Limits]
   std::size_t waitingRequestsPerClient = 8;  // WaitingRequestsPerClient, 1 to 4096
   std::size_t waitingRequests = 1024;        // WaitingRequests, 1 to 4096

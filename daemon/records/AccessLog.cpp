@@ -7,10 +7,24 @@
 
 namespace records {
 
-AccessLog::AccessLog(Database& database, RVLogService& log, state::Clock clock)
+AccessLog::AccessLog(Database& database, RVLogService& log, state::Clock clock, std::chrono::days keep)
     : database_(database),
       log_(log),
-      clock_(std::move(clock)) {
+      clock_(std::move(clock)),
+      keep_(keep) {
+}
+
+// What stands before the first entry that is young enough: no more than the old ones are looked at. An old
+// one behind it, from when the clock was wrong, goes with it.
+base::Result<void> AccessLog::pruneIn(Connection& connection) const {
+  return connection.run(
+      "DELETE FROM access_log WHERE number < coalesce((SELECT number FROM access_log WHERE time >= ?1 "
+      "ORDER BY number LIMIT 1), 9223372036854775807)",
+      std::int64_t{(clock_() - keep_).time_since_epoch().count()});
+}
+
+base::Result<void> AccessLog::prune() {
+  return database_.write([this](Connection& connection) { return pruneIn(connection); });
 }
 
 void AccessLog::RVDLogAccessRequest(std::string_view accountTypeIdentifier,
@@ -32,6 +46,7 @@ void AccessLog::RVDLogAccessRequest(std::string_view accountTypeIdentifier,
           std::int64_t{requested},
           static_cast<std::int64_t>(evidence));
       if (!added) return added;
+      if (auto pruned = pruneIn(connection); !pruned) return pruned;
       return connection.run(
           "DELETE FROM access_log WHERE number <= (SELECT max(number) FROM access_log) - ?1",
           kAccessLogEntries);

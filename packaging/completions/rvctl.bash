@@ -24,7 +24,11 @@ _rvctl() {
       mapfile -t COMPREPLY < <(compgen -W "everyone friends only_me" -- "$current")
       return
       ;;
-    --as | --app-id | --permissions | --token-fd | --credential-fd | --limit | --application)
+    --client)
+      mapfile -t COMPREPLY < <(compgen -W "$(_rvctl_clients)" -- "$current")
+      return
+      ;;
+    --as | --app-id | --permissions | --token-fd | --credential-fd | --limit | --since | --until | --application)
       return
       ;;
   esac
@@ -38,7 +42,7 @@ _rvctl() {
     access) words="--json --as --credential-fd" ;;
     authorize | forget) words="--json $(_rvctl_clients)" ;;
     revoke) words="--json --all $(_rvctl_clients)" ;;
-    log) words="--json --limit" ;;
+    log) words="--json --client --since --until --limit" ;;
     "preference "*) words="--json --application TKFacebookIgnoreAccessRequests" ;;
     *) words="--json" ;;
   esac

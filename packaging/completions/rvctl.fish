@@ -43,4 +43,7 @@ complete -c rvctl -n '__fish_seen_subcommand_from request' -l audience -x -a 'ev
 complete -c rvctl -n '__fish_seen_subcommand_from access' -l credential-fd -x -d 'Write its token to this descriptor'
 complete -c rvctl -n '__fish_seen_subcommand_from authorize revoke forget' -a '(__rvctl_clients)'
 complete -c rvctl -n '__fish_seen_subcommand_from revoke' -l all -d 'Of every application'
+complete -c rvctl -n '__fish_seen_subcommand_from log' -l client -x -a '(__rvctl_clients)' -d 'Of this application alone'
+complete -c rvctl -n '__fish_seen_subcommand_from log' -l since -x -d 'From this day or time on'
+complete -c rvctl -n '__fish_seen_subcommand_from log' -l until -x -d 'Up to this day or time'
 complete -c rvctl -n '__fish_seen_subcommand_from log' -l limit -x -d 'How many entries'

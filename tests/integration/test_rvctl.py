@@ -502,6 +502,29 @@ def test_the_access_log_is_shown(tools, rvd):
     assert [call.values for call in rvd.calls] == [(50,), (7,)]
 
 
+@pytest.mark.parametrize(
+    "arguments, times",
+    [
+        (["--client", "org.example.PhotoApp"], [1714566600]),
+        (["--client", "org.example.Nobody"], []),
+        (["--since", "1970-01-01"], [1714566600, 0]),
+        (["--since", "1970-01-01T00:00:01"], [1714566600]),
+        (["--until", "2024-05-01"], [1714566600, 0]),
+        (["--until", "2024-05-01T12:29"], [0]),
+        (["--since", "2024-05-01 12:30:00", "--until", "2024-05-01T14:30:00+02:00"], [1714566600]),
+        (["--until", "2024-05-01", "--limit", "1"], [1714566600]),
+    ],
+)
+def test_the_access_log_is_filtered(tools, rvd, arguments, times):
+    tools.world.environment["TZ"] = "UTC"
+    rvd.answers["ListAccessLog"] = ENTRIES
+    status, document = tools.json("log", *arguments)
+    assert (status, [entry["time"] for entry in document["entries"]]) == (DONE, times)
+    assert [call.values for call in rvd.calls] == [(2**32 - 1,)]
+    if not times:
+        assert tools.run("log", *arguments).out == "There is no such entry.\n"
+
+
 def test_an_empty_access_log_says_so(tools, rvd):
     rvd.answers["ListAccessLog"] = dictionaries()
     assert tools.run("log").out == "Nothing has been asked for yet.\n"
@@ -709,6 +732,9 @@ def test_output_that_cannot_be_written_is_no_success(tools, rvd):
         ["log", "--limit", "many"],
         ["log", "--limit", "-1"],
         ["log", "--limit", "4294967296"],
+        ["log", "--since", "yesterday"],
+        ["log", "--until", "2024-02-30"],
+        ["log", "--since", "2024-05-01T24:00"],
         ["preference", "get"],
         ["preference", "set", "Key"],
         ["--json"],

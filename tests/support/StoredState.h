@@ -50,7 +50,11 @@ class StoredState {
         database(valueOf(records::Database::open(*directory, log))),
         accounts(valueOf(records::Accounts::load(*database, state::randomIdentifier))),
         records(valueOf(records::AuthorizationRecords::load(*database, log, clock))),
-        accessLog(*database, log, clock),
+        accessLog(
+            *database,
+            log,
+            [this] { return now; },
+            kKeepAccessLog),
         intents(*database),
         credentialStore(valueOf(credentials::SealedStore::open(*database, *directory, std::nullopt, log))),
         keychain(std::make_unique<credentials::Keychain>(*database, *credentialStore, log)) {}
@@ -97,6 +101,9 @@ class StoredState {
     return std::chrono::sys_seconds(std::chrono::seconds(1'700'000'000));
   }
 
+  static constexpr std::chrono::days kKeepAccessLog{30};
+
+  std::chrono::sys_seconds now = clock();  // for the access log
   fakes::FakeLog log;
   std::unique_ptr<state::Directory> directory;
   std::unique_ptr<records::Database> database;

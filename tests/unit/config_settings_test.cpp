@@ -42,6 +42,7 @@ TEST_F(TheSettings, OfAnEmptyFileAreTheDefaults) {
   EXPECT_EQ(settings->messageBytes, 1048576u);
   EXPECT_EQ(settings->permissionsPerRequest, 256u);
   EXPECT_EQ(settings->nameBytes, 256u);
+  EXPECT_EQ(settings->accessLogDays, 365u);
 }
 
 TEST_F(TheSettings, AreWhatTheFileSays) {
@@ -49,7 +50,8 @@ TEST_F(TheSettings, AreWhatTheFileSays) {
       "[Server]\nURL=https://facebook.example\nTimeoutSeconds=5\nCAFile=/etc/ca.crt\n"
       "[Credentials]\nStore=secret-service\n"
       "[Limits]\nWaitingRequestsPerClient=1\nWaitingRequests=2\nCallsPerSecond=3\nMessageBytes=4096\n"
-      "PermissionsPerRequest=4\nNameBytes=5\n");
+      "PermissionsPerRequest=4\nNameBytes=5\n"
+      "[AccessLog]\nKeepDays=6\n");
   ASSERT_TRUE(settings) << settings.failure().message;
   EXPECT_EQ(settings->serverURL, "https://facebook.example");
   EXPECT_EQ(settings->transferTimeout, std::chrono::seconds(5));
@@ -61,6 +63,7 @@ TEST_F(TheSettings, AreWhatTheFileSays) {
   EXPECT_EQ(settings->messageBytes, 4096u);
   EXPECT_EQ(settings->permissionsPerRequest, 4u);
   EXPECT_EQ(settings->nameBytes, 5u);
+  EXPECT_EQ(settings->accessLogDays, 6u);
 }
 
 TEST_F(TheSettings, OfALaterFileGoBeforeThoseOfAnEarlierOne) {
@@ -106,16 +109,18 @@ TEST_F(TheSettings, WithAValueThatCannotBeUsedAreRefusedByFileLineAndKey) {
 
 TEST_F(TheSettings, AcceptTheEndsOfEachRangeAndNothingBeyond) {
   struct Range {
+    std::string section;
     std::string key;
     std::size_t least;
     std::size_t most;
   };
-  for (const Range& range : {Range{"WaitingRequestsPerClient", 1, 4096},
-                             Range{"WaitingRequests", 1, 4096},
-                             Range{"MessageBytes", 1024, std::size_t{128} << 20},
-                             Range{"PermissionsPerRequest", 1, 65536},
-                             Range{"NameBytes", 1, 65536}}) {
-    const std::string start = "[Limits]\n" + range.key + "=";
+  for (const Range& range : {Range{"Limits", "WaitingRequestsPerClient", 1, 4096},
+                             Range{"Limits", "WaitingRequests", 1, 4096},
+                             Range{"Limits", "MessageBytes", 1024, std::size_t{128} << 20},
+                             Range{"Limits", "PermissionsPerRequest", 1, 65536},
+                             Range{"Limits", "NameBytes", 1, 65536},
+                             Range{"AccessLog", "KeepDays", 1, 36500}}) {
+    const std::string start = "[" + range.section + "]\n" + range.key + "=";
     EXPECT_TRUE(read(start + std::to_string(range.least)));
     EXPECT_TRUE(read(start + std::to_string(range.most)));
     EXPECT_FALSE(read(start + std::to_string(range.least - 1)));

@@ -357,12 +357,49 @@ TEST_F(TheStoredAccessLog, KeepsHowTheClientWasKnown) {
   EXPECT_EQ(entries[2].evidence, clients::Evidence::kUnknown);
 }
 
+TEST_F(TheStoredAccessLog, LosesWhatIsTooOldAsNewEntriesCome) {
+  const auto log = [&](const std::string& client) {
+    state_->accessLog.RVDLogAccessRequest(kType, client, true, true, 0);
+  };
+  const auto begin = state_->now;
+  log("old");
+  state_->now += std::chrono::days(1);
+  log("young");
+  state_->now = begin + support::StoredState::kKeepAccessLog;
+  log("just not too old");
+  EXPECT_EQ(valueOf(state_->accessLog.newest(10)).size(), 3U);
+  state_->now += std::chrono::seconds(1);
+  log("new");
+  const auto entries = valueOf(state_->accessLog.newest(10));
+  ASSERT_EQ(entries.size(), 3U);
+  EXPECT_EQ(entries.back().clientId, "young");
+}
+
+TEST_F(TheStoredAccessLog, LosesWhatIsTooOldWhenItIsPruned) {
+  state_->accessLog.RVDLogAccessRequest(kType, "app", true, true, 0);
+  succeed(state_->accessLog.prune());
+  EXPECT_EQ(valueOf(state_->accessLog.newest(10)).size(), 1U);
+  state_->now += support::StoredState::kKeepAccessLog + std::chrono::seconds(1);
+  succeed(state_->accessLog.prune());
+  EXPECT_TRUE(valueOf(state_->accessLog.newest(10)).empty());
+  EXPECT_FALSE(isOnDisk("app"));
+}
+
+TEST_F(TheStoredAccessLog, OutlivesTheRecord) {
+  state_->put("app", true);
+  state_->accessLog.RVDLogAccessRequest(kType, "app", true, true, 0);
+  succeed(state_->records->removeAll(kType));
+  reopen();
+  EXPECT_EQ(valueOf(state_->accessLog.newest(10)).size(), 1U);
+}
+
 TEST_F(TheStoredAccessLog, KeepsNoMoreThanItsLimit) {
-  succeed(state_->database->write([](records::Connection& connection) {
+  succeed(state_->database->write([this](records::Connection& connection) {
     return connection.run(
         "WITH RECURSIVE n(i) AS (SELECT 1 UNION ALL SELECT i + 1 FROM n WHERE i < ?1) "
-        "INSERT INTO access_log SELECT i, 0, 't', NULL, 0, 0, 0 FROM n",
-        records::kAccessLogEntries);
+        "INSERT INTO access_log SELECT i, ?2, 't', NULL, 0, 0, 0 FROM n",
+        records::kAccessLogEntries,
+        std::int64_t{state_->now.time_since_epoch().count()});
   }));
   for (int i = 0; i < 3; ++i) state_->accessLog.RVDLogAccessRequest(kType, "new", true, true, 0);
   const auto entries = valueOf(state_->accessLog.newest(0xffffffff));
