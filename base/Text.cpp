@@ -1,17 +1,21 @@
 #include "base/Text.h"
 
 #include <unictype.h>
+#include <unigbrk.h>
 #include <unistr.h>
 
 #include <array>
 #include <cstdint>
 #include <cstdio>
+#include <vector>
 
 namespace base {
 namespace {
 
 constexpr ucs4_t kReplacement = 0xFFFD;
 constexpr ucs4_t kEllipsis = 0x2026;
+constexpr std::string_view kFirstStrongIsolate = "\u2068";
+constexpr std::string_view kPopDirectionalIsolate = "\u2069";
 constexpr int kMaximalMarks = 4;  // on one letter; more than any writing system puts there would pile up
 
 const std::uint8_t* bytes(std::string_view text) {
@@ -44,6 +48,28 @@ bool isBlank(ucs4_t character) {
   // The last two are symbols by category and show nothing: the empty Braille pattern and the null notehead.
   return isOf(character, UC_CATEGORY_MASK_Z) || (character >= '\t' && character <= '\r') ||
          character == 0x85 || character == 0x2800 || character == 0x1D159;
+}
+
+// Where the text's clusters begin, which are what a person takes for its characters.
+std::vector<std::size_t> clustersOf(const std::u32string& text) {
+  const std::vector<ucs4_t> characters(text.begin(), text.end());
+  std::vector<char> breaks(text.size());
+  u32_grapheme_breaks(characters.data(), characters.size(), breaks.data());
+  std::vector<std::size_t> begins;
+  for (std::size_t i = 0; i < breaks.size(); ++i)
+    if (breaks[i] != 0) begins.push_back(i);
+  return begins;
+}
+
+// At most so many clusters, and characters; the last one is "…" where something was cut off.
+void cutToClusters(std::u32string& text, std::size_t mostClusters, std::size_t mostCharacters) {
+  const bool isTooLong = text.size() > mostCharacters;
+  if (isTooLong) text.resize(mostCharacters - 1);
+  const auto begins = clustersOf(text);
+  if (begins.size() <= mostClusters && !isTooLong) return;
+  if (begins.size() >= mostClusters) text.resize(begins[mostClusters - 1]);
+  while (!text.empty() && text.back() == U' ') text.pop_back();
+  text += static_cast<char32_t>(kEllipsis);
 }
 
 std::string escaped(ucs4_t character) {
@@ -82,10 +108,12 @@ std::string visible(std::string_view text) {
 }
 
 std::string displayName(std::string_view text, std::size_t limit) {
+  // A letter with its marks is one cluster; but there are letters that join to clusters of any size.
+  const std::size_t mostCharacters = limit * (kMaximalMarks + 1);
   std::u32string name;
   bool blankIsDue = false;
   int marks = kMaximalMarks;  // a mark needs a letter to stand on
-  while (!text.empty() && name.size() <= limit) {
+  while (!text.empty() && name.size() <= mostCharacters) {
     ucs4_t character = 0;
     if (!takeCharacter(text, character)) character = kReplacement;
     if (isBlank(character)) {
@@ -105,14 +133,31 @@ std::string displayName(std::string_view text, std::size_t limit) {
     blankIsDue = false;
     name += static_cast<char32_t>(character);
   }
-  if (name.size() > limit) {
-    name.resize(limit - 1);
-    while (!name.empty() && name.back() == U' ') name.pop_back();
-    name += static_cast<char32_t>(kEllipsis);
-  }
+  cutToClusters(name, limit, mostCharacters);
   std::string result;
   for (const char32_t character : name) append(result, character);
   return result;
+}
+
+std::string isolated(std::string_view text) {
+  return std::string(kFirstStrongIsolate) + std::string(text) + std::string(kPopDirectionalIsolate);
+}
+
+std::string withoutIsolates(std::string text) {
+  for (std::size_t begin = text.find(kFirstStrongIsolate); begin != std::string::npos;
+       begin = text.find(kFirstStrongIsolate, begin)) {
+    const std::size_t inside = begin + kFirstStrongIsolate.size();
+    const std::size_t end = text.find(kPopDirectionalIsolate, inside);
+    if (end == std::string::npos) break;
+    if (text.find(kFirstStrongIsolate, inside) < end) {
+      begin = inside;
+      continue;
+    }
+    text.erase(end, kPopDirectionalIsolate.size());
+    text.erase(begin, kFirstStrongIsolate.size());
+    begin = end - kFirstStrongIsolate.size();
+  }
+  return text;
 }
 
 std::string shortened(std::string_view text, std::size_t limit) {

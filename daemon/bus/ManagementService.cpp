@@ -76,7 +76,7 @@ void ManagementService::listAuthorizations(SharedCall call) {
       reply.openContainer("a{sv}");
       for (const auto& record : parts_.records.list(accountType)) {
         RVDictionary entry{{"client_id", record.clientId},
-                           {"name", parts_.clients.clientForID(record.clientId)->localizedAppName()},
+                           {"name", parts_.clients.clientForID(record.clientId)->name()},
                            {"granted", record.granted},
                            {"options", record.options.value_or(RVDictionary())},
                            {"evidence", clients::evidenceText(record.evidence)},

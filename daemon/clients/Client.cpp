@@ -2,6 +2,8 @@
 
 #include <utility>
 
+#include "base/Text.h"
+
 namespace clients {
 
 std::string_view evidenceText(Evidence evidence) {
@@ -35,7 +37,7 @@ std::optional<std::string> Client::bundleID() const {
 }
 
 std::string Client::localizedAppName() const {
-  return name_;
+  return base::isolated(name_);
 }
 
 bool Client::hasEntitlement(std::string_view entitlement) const {

@@ -25,11 +25,15 @@ class Client final : public RVDClient {
          config::Entitlements::Names entitlements);
 
   std::optional<std::string> bundleID() const override;
+  // As it is put into sentences for the user: isolated, so that a name in the other direction of writing
+  // moves nothing of what stands around it.
   std::string localizedAppName() const override;
   bool hasEntitlement(std::string_view entitlement) const override;
   // The ID, or "(no ID)".
   std::string description() const override;
 
+  // The name alone.
+  const std::string& name() const { return name_; }
   // A name or a path; empty where the application has none.
   const std::string& icon() const { return icon_; }
   Evidence evidence() const { return evidence_; }

@@ -13,7 +13,7 @@ namespace clients {
 namespace {
 
 constexpr std::size_t kMaximalEntrySize = 512 * 1024;
-constexpr std::size_t kMaximalNameLength = 64;  // code points
+constexpr std::size_t kMaximalNameLength = 64;  // grapheme clusters
 constexpr int kMaximalProbes = 64;              // directories looked into for one ID
 constexpr std::string_view kSection = "Desktop Entry";
 

@@ -22,11 +22,23 @@ TEST(AnAlertsText, IsWhatTheDaemonSent) {
   EXPECT_EQ(text.alternateButtonTitle, "Don't Allow");
 }
 
+TEST(AnAlertsText, HasTheNamesThatTheDaemonIsolatedAsTheyAre) {
+  agents::Alert alert = anAlert();
+  alert.message = "\u201c\u2068Photo App\u2069\u201d would like to see \u2068more\u2069.";
+  EXPECT_EQ(agents::textOf(alert).message, "\u201cPhoto App\u201d would like to see more.");
+  alert.message = "\u2068Photo\u202eApp\u2069";
+  EXPECT_EQ(agents::textOf(alert).message, "Photo\\u{202e}App");
+}
+
 TEST(AnAlertsText, SaysWhoAsksAndHowThatIsKnown) {
   agents::Alert alert = anAlert();
   EXPECT_EQ(agents::textOf(alert).askedBy, "Asked by org.example.PhotoApp, as the program itself says.");
   alert.evidence = "sandbox";
-  EXPECT_EQ(agents::textOf(alert).askedBy, "Asked by org.example.PhotoApp (known by: sandbox).");
+  EXPECT_EQ(agents::textOf(alert).askedBy, "Asked by org.example.PhotoApp, as its sandbox says.");
+  alert.evidence = "scope";
+  EXPECT_EQ(agents::textOf(alert).askedBy, "Asked by org.example.PhotoApp, as which the session started it.");
+  alert.evidence = "a\nb";
+  EXPECT_EQ(agents::textOf(alert).askedBy, "Asked by org.example.PhotoApp (known by: a\\nb).");
   alert.evidence.reset();
   EXPECT_EQ(agents::textOf(alert).askedBy, "Asked by org.example.PhotoApp.");
 }

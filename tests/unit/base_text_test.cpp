@@ -34,6 +34,26 @@ TEST(ADisplayName, LosesWhatCannotBeSeen) {
   EXPECT_EQ(displayName(std::string("A\0B", 3), 64), "AB");
 }
 
+TEST(ADisplayName, IsNotMadeEndlessByLettersThatJoin) {
+  std::string joined;
+  for (int i = 0; i < 1000; ++i) joined += "\u1100";  // Hangul letters that wait for a vowel
+  const std::string shown = displayName(joined, 4);
+  EXPECT_EQ(shown.size(), std::string("\u1100").size() * 19 + std::string("…").size());
+  EXPECT_EQ(displayName(shown, 4), shown);
+}
+
+TEST(AnIsolatedText, HasNothingButThatTakenFromIt) {
+  using base::isolated;
+  using base::withoutIsolates;
+  EXPECT_EQ(isolated("a"), "\u2068a\u2069");
+  EXPECT_EQ(withoutIsolates("x" + isolated("a") + "y" + isolated("") + isolated("b")), "xayb");
+  EXPECT_EQ(withoutIsolates("\u2068a"), "\u2068a");
+  EXPECT_EQ(withoutIsolates("a\u2069"), "a\u2069");
+  EXPECT_EQ(withoutIsolates("\u2068\u2068a\u2069\u2069"), "\u2068a\u2069");
+  EXPECT_EQ(withoutIsolates("\u2069a\u2068"), "\u2069a\u2068");
+  EXPECT_EQ(withoutIsolates(""), "");
+}
+
 TEST(ADisplayName, ThatIsBlankIsEmpty) {
   EXPECT_EQ(displayName("", 64), "");
   EXPECT_EQ(displayName(" \t\u3000\u2003\u3164\u115f\u2800\u200b\u202e", 64), "");
@@ -63,6 +83,9 @@ TEST(ADisplayName, IsCutVisibly) {
   EXPECT_EQ(displayName("abcdefg", 6), "abcde…");
   EXPECT_EQ(displayName("abcd fg", 6), "abcd…");
   EXPECT_EQ(displayName("üüüüüüü", 6), "üüüüü…");
+  EXPECT_EQ(displayName("u\u0308u\u0308u\u0308u\u0308", 4), "u\u0308u\u0308u\u0308u\u0308");
+  EXPECT_EQ(displayName("u\u0308u\u0308u\u0308u\u0308u\u0308", 4), "u\u0308u\u0308u\u0308…");
+  EXPECT_EQ(displayName("🇩🇪🇫🇷🇮🇹🇪🇸", 3), "🇩🇪🇫🇷…");
   EXPECT_EQ(displayName("abcdef     ", 6), "abcdef");
 }
 

@@ -27,7 +27,7 @@ class TheClientDirectory : public testing::Test {
 TEST_F(TheClientDirectory, NamesAnInstalledClientByItsEntry) {
   const auto client = directory_.clientForID("org.example.App");
   EXPECT_EQ(client->bundleID(), "org.example.App");
-  EXPECT_EQ(client->localizedAppName(), "App");
+  EXPECT_EQ(client->name(), "App");
   EXPECT_EQ(client->icon(), "app");
   EXPECT_EQ(client->description(), "org.example.App");
   EXPECT_EQ(client->evidence(), Evidence::kUnknown);
@@ -35,25 +35,30 @@ TEST_F(TheClientDirectory, NamesAnInstalledClientByItsEntry) {
   EXPECT_FALSE(client->hasEntitlement("f"));
 }
 
+TEST_F(TheClientDirectory, HasNamesIsolatedInSentences) {
+  EXPECT_EQ(directory_.clientForID("org.example.App")->localizedAppName(), "\u2068App\u2069");
+  EXPECT_EQ(directory_.unknownClient()->localizedAppName(), "\u2068Eine unbekannte Anwendung\u2069");
+}
+
 TEST_F(TheClientDirectory, NamesAClientThatIsNotInstalledByItsID) {
   const auto client = directory_.clientForID("org.example.Gone");
   EXPECT_EQ(client->bundleID(), "org.example.Gone");
-  EXPECT_EQ(client->localizedAppName(), "org.example.Gone");
+  EXPECT_EQ(client->name(), "org.example.Gone");
   EXPECT_EQ(client->icon(), "");
   EXPECT_FALSE(client->hasEntitlement("e"));
 }
 
 TEST_F(TheClientDirectory, NeverLeavesAClientWithoutAName) {
-  EXPECT_EQ(directory_.clientForID("")->localizedAppName(), "Eine unbekannte Anwendung");
+  EXPECT_EQ(directory_.clientForID("")->name(), "Eine unbekannte Anwendung");
   EXPECT_EQ(directory_.clientForID("")->bundleID(), "");
-  EXPECT_EQ(directory_.clientForID("a\nb")->localizedAppName(), "a b");
+  EXPECT_EQ(directory_.clientForID("a\nb")->name(), "a b");
 }
 
 TEST_F(TheClientDirectory, KnowsAClientThatNothingIsKnownAbout) {
   files_.write("entitlements.d/unknown.conf", "[Eine unbekannte Anwendung]\nEntitlements=e\n");
   const auto client = directory_.unknownClient();
   EXPECT_EQ(client->bundleID(), std::nullopt);
-  EXPECT_EQ(client->localizedAppName(), "Eine unbekannte Anwendung");
+  EXPECT_EQ(client->name(), "Eine unbekannte Anwendung");
   EXPECT_EQ(client->description(), "(no ID)");
   EXPECT_EQ(clients::evidenceText(client->evidence()), "unknown");
   EXPECT_FALSE(client->hasEntitlement("e"));
@@ -62,7 +67,7 @@ TEST_F(TheClientDirectory, KnowsAClientThatNothingIsKnownAbout) {
 TEST_F(TheClientDirectory, KeepsTheNameThatAConnectionWasKnownBy) {
   const auto client =
       directory_.clientForIdentity({"org.example.App", "The old name", "old"}, Evidence::kRegistered);
-  EXPECT_EQ(client->localizedAppName(), "The old name");
+  EXPECT_EQ(client->name(), "The old name");
   EXPECT_EQ(client->icon(), "old");
   EXPECT_EQ(clients::evidenceText(client->evidence()), "registered");
   EXPECT_TRUE(client->hasEntitlement("e"));

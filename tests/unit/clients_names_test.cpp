@@ -1,5 +1,6 @@
 // Names that nobody vouches for, by the thousand, against an independent knowledge of characters.
 #include <gtest/gtest.h>
+#include <unicode/ubrk.h>
 #include <unicode/uchar.h>
 #include <unicode/utf8.h>
 
@@ -102,9 +103,21 @@ std::vector<std::string> hostilePieces() {
   return pieces;
 }
 
+// What a person takes for characters.
+std::size_t clustersIn(const std::string& text) {
+  UErrorCode status = U_ZERO_ERROR;
+  UText* utf8 = utext_openUTF8(nullptr, text.data(), static_cast<std::int64_t>(text.size()), &status);
+  UBreakIterator* breaks = ubrk_open(UBRK_CHARACTER, "en", nullptr, 0, &status);
+  ubrk_setUText(breaks, utf8, &status);
+  std::size_t count = 0;
+  while (ubrk_next(breaks) != UBRK_DONE) ++count;
+  ubrk_close(breaks);
+  utext_close(utf8);
+  return U_SUCCESS(status) ? count : SIZE_MAX;
+}
+
 // What is wrong with a name that is shown; empty where nothing is.
 std::string faultOf(const std::string& name) {
-  std::size_t length = 0;
   int marks = 0;
   for (std::int32_t at = 0; at < static_cast<std::int32_t>(name.size());) {
     UChar32 character = 0;
@@ -118,11 +131,10 @@ std::string faultOf(const std::string& name) {
     if ((category & U_GC_Z_MASK) != 0 && character != ' ') return "holds an unusual blank";
     marks = (category & U_GC_M_MASK) != 0 ? marks + 1 : 0;
     if (marks > 4) return "holds a pile of marks";
-    ++length;
   }
   if (name.empty()) return "is empty";
   if (name.front() == ' ' || name.back() == ' ' || name.find("  ") != std::string::npos) return "has blanks";
-  if (length > kLimit) return "is too long";
+  if (clustersIn(name) > kLimit) return "is too long";
   return "";
 }
 
