@@ -19,7 +19,12 @@ class Rvd:
 
     def __init__(self, application_id):
         self._bus = Gio.bus_get_sync(Gio.BusType.SESSION)
-        self._call("Register", GLib.Variant("(s)", (application_id,)))
+        try:
+            self._call("Register", GLib.Variant("(s)", (application_id,)))
+        except GLib.Error as error:
+            # Known already: by the sandbox that it runs in, or by the unit that the session started.
+            if Gio.DBusError.get_remote_error(error) != "com.zentor.rvd.Error.AlreadyIdentified":
+                raise
 
     def _call(self, method, arguments):
         # Without a time-out: the answer comes when the user has answered.
