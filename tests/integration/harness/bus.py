@@ -35,6 +35,7 @@ CONFIGURATION = """<!DOCTYPE busconfig PUBLIC "-//freedesktop//DTD D-Bus Bus Con
     <allow eavesdrop="true"/>
     <allow own="*"/>
   </policy>
+  {policies}
   <limit name="max_incoming_bytes">1000000000</limit>
   <limit name="max_incoming_unix_fds">250000000</limit>
   <limit name="max_outgoing_bytes">1000000000</limit>
@@ -64,9 +65,10 @@ class BusError(Exception):
 
 
 class Bus:
-    """A message bus of the test's own. service_dirs: where it looks for services to start."""
+    """A message bus of the test's own. service_dirs: where it looks for services to start. policies: files of
+    further policies."""
 
-    def __init__(self, folder, environment, service_dirs=()):
+    def __init__(self, folder, environment, service_dirs=(), policies=()):
         socket = os.path.join(folder, "bus")
         configuration = os.path.join(folder, "bus.conf")
         with open(configuration, "w", encoding="utf-8") as file:
@@ -74,6 +76,7 @@ class Bus:
                 CONFIGURATION.format(
                     socket=socket,
                     servicedirs="".join(f"<servicedir>{path}</servicedir>" for path in service_dirs),
+                    policies="".join(f"<include>{path}</include>" for path in policies),
                 )
             )
         self.process = Process(

@@ -53,8 +53,8 @@ class World:
         os.chmod(path, mode)
         return path
 
-    def start_bus(self, service_dirs=()):
-        self.bus = Bus(self.folder("bus"), self.environment, service_dirs)
+    def start_bus(self, service_dirs=(), policies=()):
+        self.bus = Bus(self.folder("bus"), self.environment, service_dirs, policies)
         self.environment["DBUS_SESSION_BUS_ADDRESS"] = self.bus.address
         self._watch = NameWatch(self.bus.connect(), NAME)
 
