@@ -1,7 +1,6 @@
 #include "base/Languages.h"
 
 #include <algorithm>
-#include <string_view>
 
 namespace base {
 namespace {
@@ -47,6 +46,14 @@ std::vector<std::string> languageChain(const LanguageVariables& variables) {
     appendLocale(chain, list.substr(0, colon));
     list.remove_prefix(std::min(colon + 1, list.size()));
   }
+  appendLocale(chain, locale);
+  return chain;
+}
+
+std::vector<std::string> chainOfLanguage(std::string_view language) {
+  std::string locale(language);
+  std::replace(locale.begin(), locale.end(), '-', '_');
+  std::vector<std::string> chain;
   appendLocale(chain, locale);
   return chain;
 }

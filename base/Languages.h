@@ -2,6 +2,7 @@
 #pragma once
 
 #include <string>
+#include <string_view>
 #include <vector>
 
 namespace base {
@@ -20,5 +21,9 @@ struct LanguageVariables {
 // asks for untranslated texts: the chain is then empty. No language is named twice; a name that is no
 // locale's (a path, say) is left out.
 std::vector<std::string> languageChain(const LanguageVariables& variables);
+
+// The chain of one language, given as a locale or a tag ("de", "de_AT.UTF-8", "pt-BR"). Empty for what names
+// none.
+std::vector<std::string> chainOfLanguage(std::string_view language);
 
 }  // namespace base

@@ -45,6 +45,13 @@ constexpr std::chrono::seconds kKeepIdleThreads{10};
 constexpr std::chrono::seconds kInspectionDeadline{5};
 constexpr std::size_t kMostInspections = 16;
 
+// The name of an application that is not known.
+constexpr const char* kUnknownApplication = "An unknown application";
+
+http::FacebookServerSettings serverOf(const config::Settings& settings) {
+  return {settings.serverURL, settings.transferTimeout, settings.caFile.value_or("")};
+}
+
 // The languages as the header Accept-Language lists them: best first, each a little less wanted.
 std::string acceptLanguage(const std::vector<std::string>& languages) {
   std::vector<std::string> tags;
@@ -99,7 +106,7 @@ struct Daemon::Bus {
         agents(*connection, loop),
         applications(places.applicationDirectories, places.languages),
         entitlements(places.entitlementsDirectory, places.entitlementsTrust, log),
-        clients(applications, entitlements, "An unknown application"),
+        clients(applications, entitlements, kUnknownApplication),
         identities(
             senders,
             {clients::makeInspect(std::make_shared<clients::SystemProcesses>(),
@@ -129,7 +136,7 @@ struct Daemon::Work {
         transfers(log),
         facebookRequests(
             transfers,
-            {settings.serverURL, settings.transferTimeout, settings.caFile.value_or("")},
+            serverOf(settings),
             [&storage] { return masterToken(*storage.accounts, *storage.keychain); },
             acceptLanguage(places.languages),
             log),
@@ -157,6 +164,7 @@ struct Daemon::Work {
   requests::RequestPool pool;
   requests::RequestTable table;
   std::vector<std::unique_ptr<plugins::PluginModule>> plugins;
+  bus::RehearsalParts rehearsal;
 
   std::unique_ptr<sdbus::IObject> object;
   std::unique_ptr<bus::Dispatcher> dispatcher;
@@ -229,18 +237,18 @@ base::Result<void> Daemon::openStorage(const Places& places) {
 void Daemon::serve(const Places& places) {
   Storage& storage = *storage_;
   Work& work = *work_;
-  work.plugins = plugins::loadPlugins(places.pluginDirectory,
-                                      {storage.keychain.get(),
-                                       &work.facebookRequests,
-                                       &work.alerts,
-                                       storage.preferences.get(),
-                                       &work.queues,
-                                       &work.notifications,
-                                       &work.jsonReader,
-                                       nullptr,
-                                       &log_,
-                                       storage.accessLog.get()},
-                                      places.languages);
+  const RVDHostServices services{storage.keychain.get(),
+                                 &work.facebookRequests,
+                                 &work.alerts,
+                                 storage.preferences.get(),
+                                 &work.queues,
+                                 &work.notifications,
+                                 &work.jsonReader,
+                                 nullptr,
+                                 &log_,
+                                 storage.accessLog.get()};
+  work.plugins = plugins::loadPlugins(places.pluginDirectory, services, places.languages);
+  work.rehearsal = rehearsalParts(places, services);
 
   work.object = sdbus::createObject(*bus_->connection, bus::kObjectPath);
   work.dispatcher =
@@ -262,7 +270,8 @@ void Daemon::serve(const Places& places) {
                          work.rate,
                          std::make_shared<requests::WaitingLimits>(
                              work.pool, settings_.waitingRequestsPerClient, settings_.waitingRequests),
-                         std::make_shared<requests::UnlimitedWaiting>(work.pool)};
+                         std::make_shared<requests::UnlimitedWaiting>(work.pool),
+                         work.rehearsal};
   work.accountsService =
       std::make_unique<bus::AccountsService>(*work.object, *work.dispatcher, bus_->loop, parts);
   work.managementService = std::make_unique<bus::ManagementService>(
@@ -288,6 +297,27 @@ void Daemon::serve(const Places& places) {
     throw std::runtime_error(std::string("the name ") + bus::kServiceName +
                              " was not to be had: " + error.getMessage());
   }
+}
+
+bus::RehearsalParts Daemon::rehearsalParts(const Places& places, const RVDHostServices& services) {
+  const auto accountToken = [&storage = *storage_] {
+    return masterToken(*storage.accounts, *storage.keychain);
+  };
+  return {services,
+          [&requests = work_->facebookRequests](const auto& permissions) {
+            return requests.problemWithSending(permissions);
+          },
+          [this, accountToken](const std::vector<std::string>& languages) -> rehearsal::Server {
+            return {std::make_shared<http::FacebookRequests>(
+                        work_->transfers, serverOf(settings_), accountToken, acceptLanguage(languages), log_),
+                    accountToken};
+          },
+          [&entitlements = bus_->entitlements, directories = places.applicationDirectories](
+              const std::string& id, const std::vector<std::string>& languages) {
+            const clients::InstalledApplications applications(directories, languages);
+            return clients::ClientDirectory(applications, entitlements, kUnknownApplication).clientForID(id);
+          },
+          places.languages};
 }
 
 void Daemon::connectionLeft(const std::string& uniqueName) {

@@ -10,7 +10,12 @@
 #include "base/Result.h"
 #include "daemon/config/Entitlements.h"
 #include "daemon/config/Settings.h"
+#include "host/RVDAccountAccessPlugin.h"
 #include "host/RVLog.h"
+
+namespace bus {
+struct RehearsalParts;
+}
 
 namespace rvd {
 
@@ -50,6 +55,7 @@ class Daemon {
   Daemon(const config::Settings& settings, RVLogService& log);
   base::Result<void> openStorage(const Places& places);
   void serve(const Places& places);
+  bus::RehearsalParts rehearsalParts(const Places& places, const RVDHostServices& services);
   void connectionLeft(const std::string& uniqueName);
   void stop();
 

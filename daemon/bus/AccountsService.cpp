@@ -6,6 +6,7 @@
 
 #include "daemon/bus/Answers.h"
 #include "daemon/bus/Names.h"
+#include "daemon/bus/RequestOptions.h"
 #include "daemon/bus/Values.h"
 #include "host/Constants.h"
 #include "interfaces/Accounts1Methods.h"
@@ -36,18 +37,6 @@ void writeSecret(sdbus::Message& message, const RVSecret& secret) {
   }
   RVSecret::wipe(text.data(), text.size());
   message.closeVariant();
-}
-
-// A name's bytes; of something that is no name, as many as it has parts and bytes of text, since it may
-// be remembered all the same.
-std::size_t bytesOf(const RVValue& value) {
-  if (value.string() != nullptr) return value.string()->size();
-  std::size_t bytes = 1;
-  if (value.array() != nullptr)
-    for (const RVValue& element : *value.array()) bytes += bytesOf(element);
-  if (value.dictionary() != nullptr)
-    for (const auto& [key, element] : *value.dictionary()) bytes += key.size() + bytesOf(element);
-  return bytes;
 }
 
 void writeCredential(sdbus::Message& message, const RVAccountCredential& credential) {
@@ -122,30 +111,12 @@ void AccountsService::checkRate(const std::string& uniqueName) const {
   if (!parts_.rate.take(key)) throw sdbus::Error(kLimitsExceeded, "The client calls too often");
 }
 
-void AccountsService::checkSizes(const RVDictionary& options) const {
-  const auto& settings = parts_.settings;
-  const auto checkName = [&](const RVValue& value) {
-    if (bytesOf(value) > settings.nameBytes)
-      throw sdbus::Error(kLimitsExceeded, "A name in the options is too long");
-  };
-  for (const auto& [key, value] : options) {
-    if (key != RVFacebookPermissionsKey) {
-      checkName(value);
-    } else if (const RVArray* permissions = value.array()) {
-      if (permissions->size() > settings.permissionsPerRequest)
-        throw sdbus::Error(kLimitsExceeded, "There are too many permissions");
-      for (const RVValue& permission : *permissions) checkName(permission);
-    }
-  }
-}
-
 void AccountsService::requestAccess(const std::shared_ptr<Call>& call) {
   SizeLimit limit{parts_.settings.messageBytes};
   std::string accountType = readString(call->message(), limit);
-  auto options = std::make_shared<const RVDictionary>(readOptions(
-      call->message(), limit, {RVFacebookAppIdKey, RVFacebookPermissionsKey, RVFacebookAudienceKey}));
+  auto options =
+      std::make_shared<const RVDictionary>(readRequestOptions(call->message(), limit, parts_.settings));
   const bool allowUserInteraction = readBoolean(call->message(), limit);
-  checkSizes(*options);
   checkRate(call->sender());
   auto& plugin = pluginForAccountType(parts_, accountType);
   const auto client = clientOfConnection(parts_, call->sender(), accountType);

@@ -25,7 +25,6 @@ class AccountsService {
   void getAccess(const std::shared_ptr<Call>& call);
   void getCredential(const std::shared_ptr<Call>& call);
   void checkRate(const std::string& uniqueName) const;
-  void checkSizes(const RVDictionary& options) const;
 
   sdbus::IObject& object_;
   Dispatcher& dispatcher_;

@@ -3,27 +3,26 @@
 #include <algorithm>
 #include <cstdint>
 #include <limits>
-#include <map>
-#include <string>
 
 #include "daemon/bus/Names.h"
 #include "daemon/bus/Values.h"
 
 namespace bus {
 
+std::map<std::string, sdbus::Variant> errorEntries(const RVError& error) {
+  using Limits = std::numeric_limits<std::int32_t>;
+  std::map<std::string, sdbus::Variant> entries;
+  entries.emplace("domain", busText(error.domain));
+  entries.emplace(
+      "code", static_cast<std::int32_t>(std::clamp<std::int64_t>(error.code, Limits::min(), Limits::max())));
+  if (const auto description = error.localizedDescription())
+    entries.emplace("description", busText(*description));
+  return entries;
+}
+
 void answerDecision(Call& call, bool granted, const std::optional<RVError>& error) noexcept {
   call.reply([&](sdbus::MethodReply& reply) {
-    using Limits = std::numeric_limits<std::int32_t>;
-    std::map<std::string, sdbus::Variant> entries;
-    if (error) {
-      entries.emplace("domain", busText(error->domain));
-      entries.emplace(
-          "code",
-          static_cast<std::int32_t>(std::clamp<std::int64_t>(error->code, Limits::min(), Limits::max())));
-      if (const auto description = error->localizedDescription())
-        entries.emplace("description", busText(*description));
-    }
-    reply << granted << entries;
+    reply << granted << (error ? errorEntries(*error) : std::map<std::string, sdbus::Variant>());
   });
 }
 

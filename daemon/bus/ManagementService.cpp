@@ -18,11 +18,15 @@ namespace {
 std::string readClientID(Call& call) {
   std::string id;
   call.message() >> id;
-  if (id.empty()) throw sdbus::Error(kInvalidArgs, "The client ID is empty");
+  checkClientID(id);
   return id;
 }
 
 }  // namespace
+
+void checkClientID(const std::string& id) {
+  if (id.empty()) throw sdbus::Error(kInvalidArgs, "The client ID is empty");
+}
 
 void throwFailure(const base::Failure& failure) {
   const bool isCallersMistake =
@@ -56,6 +60,7 @@ ManagementService::ManagementService(sdbus::IObject& object,
                     {"RevokeAllAccess", handler(&Self::revokeAllAccess)},
                     {"ForgetRefusal", handler(&Self::forgetRefusal)},
                     {"ListAccessLog", handler(&Self::listAccessLog)},
+                    {"ExplainAccess", handler(&Self::explainAccess)},
                     {"GetPreference", handler(&Self::getPreference)},
                     {"SetPreference", handler(&Self::setPreference)},
                     {"ResetPreference", handler(&Self::resetPreference)},

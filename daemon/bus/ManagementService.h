@@ -52,6 +52,9 @@ class ManagementService {
   void listAccessLog(SharedCall call);
   std::vector<std::string> clientsWithRecord(const std::string& accountType) const;
 
+  // Why a request would end as it would: ManagedExplanations.cpp.
+  void explainAccess(SharedCall call);
+
   // Preferences: ManagedPreferences.cpp.
   void getPreference(SharedCall call);
   void setPreference(SharedCall call);
@@ -70,5 +73,8 @@ class ManagementService {
 
 // Throws sdbus::Error for a failure: InvalidArgs where what was asked for makes no sense, else Failed.
 void throwFailure(const base::Failure& failure);
+
+// Throws sdbus::Error (InvalidArgs) for what can be no client's ID.
+void checkClientID(const std::string& id);
 
 }  // namespace bus

@@ -6,10 +6,14 @@
 
 namespace bus {
 
-RVDAccountAccessPlugin& pluginForAccountType(const Parts& parts, const std::string& accountType) {
+plugins::PluginModule& moduleForAccountType(const Parts& parts, const std::string& accountType) {
   for (const auto& module : parts.plugins)
-    if (module->supportsAccountType(accountType)) return module->plugin();
+    if (module->supportsAccountType(accountType)) return *module;
   throw sdbus::Error(kUnsupportedAccountType, "No plug-in serves this account type");
+}
+
+RVDAccountAccessPlugin& pluginForAccountType(const Parts& parts, const std::string& accountType) {
+  return moduleForAccountType(parts, accountType).plugin();
 }
 
 std::shared_ptr<RVDAccountStore> makeStore(const Parts& parts) {

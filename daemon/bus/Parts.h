@@ -1,6 +1,7 @@
 // What the services on the bus work with.
 #pragma once
 
+#include <functional>
 #include <memory>
 #include <string>
 #include <string_view>
@@ -18,6 +19,7 @@
 #include "daemon/records/AuthorizationRecords.h"
 #include "daemon/records/Intents.h"
 #include "daemon/records/RequestStore.h"
+#include "daemon/rehearsal/Rehearsal.h"
 #include "daemon/requests/RateLimit.h"
 #include "daemon/requests/RequestPool.h"
 #include "daemon/requests/RequestTable.h"
@@ -25,6 +27,18 @@
 #include "host/RVLog.h"
 
 namespace bus {
+
+// What requests are rehearsed with, in whatever languages. The functions are called from any thread.
+struct RehearsalParts {
+  using Languages = std::vector<std::string>;  // see base::languageChain
+
+  RVDHostServices services;  // the real ones; the string table is absent
+  rehearsal::ProblemWithSending problemWithSending;
+  std::function<rehearsal::Server(const Languages& languages)> serverSpeaking;
+  std::function<std::shared_ptr<const RVDClient>(const std::string& id, const Languages& languages)>
+      clientNamed;
+  Languages languages;  // the user's
+};
 
 // Everything outlives the services.
 struct Parts {
@@ -45,9 +59,12 @@ struct Parts {
   requests::RateLimit& rate;
   std::shared_ptr<requests::WaitingLimiter> limits;
   std::shared_ptr<requests::WaitingLimiter> noLimits;
+  const RehearsalParts& rehearsal;
 };
 
-// The plug-in that serves the account type. Throws sdbus::Error (UnsupportedAccountType) where none does.
+// The module whose plug-in serves the account type, and that plug-in. Throw sdbus::Error
+// (UnsupportedAccountType) where none does.
+plugins::PluginModule& moduleForAccountType(const Parts& parts, const std::string& accountType);
 RVDAccountAccessPlugin& pluginForAccountType(const Parts& parts, const std::string& accountType);
 
 // What a plug-in is given for one call; it belongs to the calling thread's current request, if any.

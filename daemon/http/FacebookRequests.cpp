@@ -100,6 +100,14 @@ class FacebookRequests::Server {
         acceptLanguage_(std::move(acceptLanguage)),
         log_(log) {}
 
+  // Why a request for the permissions is not to be sent at all.
+  std::optional<RVError> problemWith(const std::optional<RVPermissionSet>& permissions) const {
+    if (permissions && !isListable(*permissions))
+      return transferError(TransferErrorCode::kNotSendable, "a permission's name holds a comma");
+    if (!settings_.url) return transferError(TransferErrorCode::kNoServer);
+    return std::nullopt;
+  }
+
   // For the request that is current on this thread. problem: why it is not to be sent at all.
   void send(const std::string& exchangeName,
             Form form,
@@ -111,7 +119,6 @@ class FacebookRequests::Server {
     if (!exchange->beginWaiting())
       return transfers_.fail(transferError(TransferErrorCode::kCancelled), handle);
     if (problem) return transfers_.fail(*problem, handle);
-    if (!settings_.url) return transfers_.fail(transferError(TransferErrorCode::kNoServer), handle);
     const auto transfer =
         transfers_.start(transferFor(exchangeName, std::move(form), std::move(token)), handle);
     exchange->endWhenVoid(transfers_, transfer);
@@ -202,11 +209,6 @@ class Session final : public TKFacebookSession {
   const std::shared_ptr<const FacebookRequests::Server> server_;
 };
 
-std::optional<RVError> problemWith(const std::optional<RVPermissionSet>& permissions) {
-  if (!permissions || isListable(*permissions)) return std::nullopt;
-  return transferError(TransferErrorCode::kNotSendable, "a permission's name holds a comma");
-}
-
 }  // namespace
 
 FacebookRequests::FacebookRequests(TransferThread& transfers,
@@ -232,7 +234,7 @@ std::shared_ptr<TKFacebookAuthorizationRequest> FacebookRequests::initWithAppId(
   if (permissions) form.emplace_back("permissions", joined(*permissions));
   addIfPresent(form, "audience", audience);
   return std::make_shared<Request<TKFacebookAuthorizationRequest>>(
-      server_, "authorize", std::move(form), problemWith(permissions));
+      server_, "authorize", std::move(form), server_->problemWith(permissions));
 }
 
 std::shared_ptr<TKFacebookPermissionDescriptionRequest> FacebookRequests::initWithPermissions(
@@ -241,7 +243,12 @@ std::shared_ptr<TKFacebookPermissionDescriptionRequest> FacebookRequests::initWi
   Form form{{"permissions", joined(permissions)}};
   addIfPresent(form, "audience", audience);
   return std::make_shared<Request<TKFacebookPermissionDescriptionRequest>>(
-      server_, "describe", std::move(form), problemWith(permissions));
+      server_, "describe", std::move(form), server_->problemWith(permissions));
+}
+
+std::optional<RVError> FacebookRequests::problemWithSending(
+    const std::optional<RVPermissionSet>& permissions) const {
+  return server_->problemWith(permissions);
 }
 
 std::shared_ptr<TKFacebookSession> FacebookRequests::initSession() {

@@ -54,6 +54,10 @@ class FacebookRequests final : public TKFacebookRequestFactory {
 
   std::shared_ptr<TKFacebookSession> initSession() override;
 
+  // Why a request for these permissions is answered with an error and never sent, whatever the server;
+  // absent where it is sent.
+  std::optional<RVError> problemWithSending(const std::optional<RVPermissionSet>& permissions) const;
+
   class Server;
 
  private:

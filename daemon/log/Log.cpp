@@ -45,6 +45,11 @@ void logLine(RVLogService& log,
 
 }  // namespace
 
+std::string lineOf(const Entry& entry) {
+  return std::string(levelText(entry.level)) + ": " + entry.message + " [" + entry.sourceFile + ":" +
+         std::to_string(entry.line) + " " + entry.functionName + "]";
+}
+
 JournalSink::JournalSink(std::string identifier)
     : identifier_(std::move(identifier)) {
 }
@@ -75,9 +80,7 @@ DescriptorSink::DescriptorSink(int descriptor)
 }
 
 void DescriptorSink::write(const Entry& entry) {
-  std::string text(levelText(entry.level));
-  text += ": " + entry.message + " [" + entry.sourceFile + ":" + std::to_string(entry.line) + " " +
-          entry.functionName + "]\n";
+  const std::string text = lineOf(entry) + "\n";
   std::string_view rest = text;
   while (!rest.empty()) {
     const ssize_t written = ::write(descriptor_, rest.data(), rest.size());

@@ -21,6 +21,9 @@ struct Entry {
   std::string message;
 };
 
+// The entry as one line, without its end: "error: message [file:line function]".
+std::string lineOf(const Entry& entry);
+
 // Where the lines go. Called from any thread.
 class LogSink {
  public:

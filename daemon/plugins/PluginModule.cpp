@@ -10,7 +10,6 @@
 #include <utility>
 
 #include "daemon/log/Log.h"
-#include "daemon/plugins/StringTable.h"
 
 namespace plugins {
 namespace {
@@ -44,12 +43,18 @@ base::Result<const RVDAccountAccessPluginEntry*> entryOf(const std::string& path
   return entry;
 }
 
+std::string moduleOf(const std::string& bundle) {
+  return bundle + "/" + std::filesystem::path(bundle).filename().string() + ".so";
+}
+
 }  // namespace
 
-PluginModule::PluginModule(const RVDAccountAccessPluginEntry& entry,
-                           std::unique_ptr<RVStringTable> stringTable,
+PluginModule::PluginModule(std::string bundle,
+                           const RVDAccountAccessPluginEntry& entry,
+                           std::unique_ptr<StringTable> stringTable,
                            std::unique_ptr<RVDAccountAccessPlugin> plugin)
-    : entry_(entry),
+    : bundle_(std::move(bundle)),
+      entry_(entry),
       className_(entry.className),
       stringTable_(std::move(stringTable)),
       plugin_(std::move(plugin)) {
@@ -58,22 +63,36 @@ PluginModule::PluginModule(const RVDAccountAccessPluginEntry& entry,
 base::Result<std::unique_ptr<PluginModule>> PluginModule::load(const std::string& bundle,
                                                                const RVDHostServices& services,
                                                                const std::vector<std::string>& languages) {
-  const std::string path = bundle + "/" + std::filesystem::path(bundle).filename().string() + ".so";
-  const auto entry = entryOf(path);
+  const auto entry = entryOf(moduleOf(bundle));
   if (!entry) return entry.failure();
+  return make(bundle, **entry, services, languages);
+}
+
+base::Result<std::unique_ptr<PluginModule>> PluginModule::another(
+    const RVDHostServices& services,
+    const std::vector<std::string>& languages) const {
+  return make(bundle_, entry_, services, languages);
+}
+
+base::Result<std::unique_ptr<PluginModule>> PluginModule::make(const std::string& bundle,
+                                                               const RVDAccountAccessPluginEntry& entry,
+                                                               const RVDHostServices& services,
+                                                               const std::vector<std::string>& languages) {
+  const std::string path = moduleOf(bundle);
   auto stringTable = std::make_unique<StringTable>(bundle + "/resources", languages, *services.log);
   RVDHostServices own = services;
   own.stringTable = stringTable.get();
   std::unique_ptr<RVDAccountAccessPlugin> plugin;
   try {
-    plugin = (*entry)->init(own);
+    plugin = entry.init(own);
   } catch (const std::exception& exception) {
     return Failure{FailureKind::kFailed, path + ": could not be set up: " + exception.what()};
   } catch (...) {
     return Failure{FailureKind::kFailed, path + ": could not be set up"};
   }
   if (plugin == nullptr) return Failure{FailureKind::kFailed, path + ": could not be set up"};
-  return std::unique_ptr<PluginModule>(new PluginModule(**entry, std::move(stringTable), std::move(plugin)));
+  return std::unique_ptr<PluginModule>(
+      new PluginModule(bundle, entry, std::move(stringTable), std::move(plugin)));
 }
 
 bool PluginModule::supportsAccountType(const std::optional<std::string>& identifier) const {

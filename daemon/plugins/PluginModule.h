@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/Result.h"
+#include "daemon/plugins/StringTable.h"
 #include "host/RVDAccountAccessPlugin.h"
 
 namespace plugins {
@@ -23,19 +24,31 @@ class PluginModule {
                                                           const RVDHostServices& services,
                                                           const std::vector<std::string>& languages);
 
+  // One more plug-in object of the module, with services, words and a string table of its own; as load
+  // otherwise. This object need not outlive it.
+  base::Result<std::unique_ptr<PluginModule>> another(const RVDHostServices& services,
+                                                      const std::vector<std::string>& languages) const;
+
   const std::string& className() const { return className_; }
   bool supportsAccountType(const std::optional<std::string>& identifier) const;
   // Lives as long as the module.
   RVDAccountAccessPlugin& plugin() const { return *plugin_; }
+  const StringTable& stringTable() const { return *stringTable_; }
 
  private:
-  PluginModule(const RVDAccountAccessPluginEntry& entry,
-               std::unique_ptr<RVStringTable> stringTable,
+  PluginModule(std::string bundle,
+               const RVDAccountAccessPluginEntry& entry,
+               std::unique_ptr<StringTable> stringTable,
                std::unique_ptr<RVDAccountAccessPlugin> plugin);
+  static base::Result<std::unique_ptr<PluginModule>> make(const std::string& bundle,
+                                                          const RVDAccountAccessPluginEntry& entry,
+                                                          const RVDHostServices& services,
+                                                          const std::vector<std::string>& languages);
 
-  const RVDAccountAccessPluginEntry& entry_;
+  const std::string bundle_;
+  const RVDAccountAccessPluginEntry& entry_;  // lives until the process ends
   const std::string className_;
-  const std::unique_ptr<RVStringTable> stringTable_;  // outlives the plug-in object
+  const std::unique_ptr<StringTable> stringTable_;  // outlives the plug-in object
   const std::unique_ptr<RVDAccountAccessPlugin> plugin_;
 };
 

@@ -43,6 +43,7 @@ StringTable::StringTable(const std::string& resources,
         logging::error(log, "A string table is left out: %@.", {reason});
         continue;
       }
+      languages_.insert(language);
       texts.merge(*catalogue);  // what a better language has stays
     }
   }

@@ -3,6 +3,7 @@
 
 #include <map>
 #include <optional>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -26,8 +27,12 @@ class StringTable final : public RVStringTable {
   std::string stringWithFormat(std::string_view format,
                                const std::vector<std::optional<RVValue>>& arguments) const override;
 
+  // Whether any table has texts in the language, which is one of the chain or English.
+  bool hasLanguage(const std::string& language) const { return languages_.contains(language); }
+
  private:
   using Texts = std::map<std::string, std::string, std::less<>>;
+  std::set<std::string> languages_;
   std::map<std::string, Texts, std::less<>> tables_;  // each key with its text in the best language
 };
 

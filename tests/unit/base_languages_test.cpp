@@ -36,4 +36,12 @@ TEST(TheLanguageChain, HoldsNoPaths) {
   EXPECT_EQ(languageChain({.language = "../../etc:/tmp/x:de", .lang = "a/b"}), (Chain{"de"}));
 }
 
+TEST(TheLanguageChain, OfOneLanguageTakesALocaleAndATag) {
+  EXPECT_EQ(base::chainOfLanguage("de"), (Chain{"de"}));
+  EXPECT_EQ(base::chainOfLanguage("pt-BR"), (Chain{"pt_BR", "pt"}));
+  EXPECT_EQ(base::chainOfLanguage("sr_RS.UTF-8@latin"), (Chain{"sr_RS@latin", "sr_RS", "sr@latin", "sr"}));
+  for (const char* none : {"", "C", "POSIX", "../etc", "d e", "de\n"})
+    EXPECT_EQ(base::chainOfLanguage(none), Chain{}) << none;
+}
+
 }  // namespace

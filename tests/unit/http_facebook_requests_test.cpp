@@ -133,6 +133,16 @@ TEST_F(AFacebookRequest, ToAServerThatMayNotBeUsedSaysWhy) {
   EXPECT_THAT(outcome.errorText(), HasSubstr("is plain http"));
 }
 
+TEST_F(AFacebookRequest, ThatWillNotBeSentIsKnownBeforehand) {
+  const auto factory = factoryFor("https://facebook.example");
+  EXPECT_EQ(factory->problemWithSending(RVPermissionSet{"email", "odd"}), std::nullopt);
+  EXPECT_EQ(factory->problemWithSending(std::nullopt), std::nullopt);
+  EXPECT_EQ(factory->problemWithSending(RVPermissionSet{"odd,email"})->code,
+            static_cast<std::int64_t>(TransferErrorCode::kNotSendable));
+  EXPECT_EQ(factoryFor(std::nullopt)->problemWithSending(std::nullopt)->code,
+            static_cast<std::int64_t>(TransferErrorCode::kNoServer));
+}
+
 TEST_F(AFacebookRequest, ForANameThatWouldReadAsTwoIsNotSent) {
   const LoopbackServer server(httpAnswer("{}"));
   const auto factory = factoryFor(server.url());

@@ -71,6 +71,28 @@ TEST_F(APluginDirectory, GivesEachPluginTheStringTableOfItsOwnBundle) {
   EXPECT_EQ(services_.stringTable, &hostsTable_);
 }
 
+TEST_F(APluginDirectory, GivesAnotherObjectOfAModuleServicesAndWordsOfItsOwn) {
+  const auto module = PluginModule::load(kTestModules + "Working", services_, {"fr"});
+  ASSERT_TRUE(module) << module.failure().message;
+  fakes::FakeLog log;
+  RVDHostServices services = services_;
+  services.log = &log;
+  const auto another = (*module)->another(services, {"de_AT", "de"});
+  ASSERT_TRUE(another) << another.failure().message;
+  const auto greetingOf = [](const PluginModule& of) {
+    std::string text;
+    of.plugin().revokeAllAccessToAccountsOfType(
+        nullptr, nullptr, [&text](bool, const std::optional<RVError>& error) { text = error->domain; });
+    return text;
+  };
+  EXPECT_EQ(greetingOf(**another), "Guten Tag");
+  EXPECT_EQ(greetingOf(**module), "Hello");
+  EXPECT_TRUE((*another)->stringTable().hasLanguage("de"));
+  EXPECT_TRUE((*another)->stringTable().hasLanguage("en"));
+  EXPECT_FALSE((*another)->stringTable().hasLanguage("de_AT"));
+  EXPECT_FALSE((*module)->stringTable().hasLanguage("de"));
+}
+
 TEST_F(APluginDirectory, IsNamedByAnAbsolutePath) {
   EXPECT_TRUE(loadPlugins("plugins", services_, {}).empty());
   EXPECT_EQ(log_.texts(), std::vector<std::string>{"No plug-in is loaded: plugins is no absolute path."});
