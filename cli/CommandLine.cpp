@@ -36,7 +36,9 @@ struct CommandLine {
   Text client;
   Text since;
   Text until;
+  Text language;
   bool all = false;
+  bool online = false;
   std::function<ExitStatus(Session&)> chosen;
 };
 
@@ -114,17 +116,37 @@ void addAccountCommands(CommandLine& line) {
   addSubject(line, removing, "ID", "the account's ID, as 'rvctl account list' shows it");
 }
 
-void addRequestCommand(CommandLine& line) {
-  CLI::App* command = addCommand(
-      line, &line.app, "request", "Ask for access, as an application does", [&line](Session& session) {
-        RequestOptions options{line.appID, std::nullopt, line.audience};
-        if (line.permissions) options.permissions = namesIn(*line.permissions);
-        return requestAccess(session, line.as, options);
-      });
-  addText(command, "--as", line.as, "APP_ID", "ask as this installed application");
+RequestOptions requestOptions(const CommandLine& line) {
+  RequestOptions options{line.appID, std::nullopt, line.audience};
+  if (line.permissions) options.permissions = namesIn(*line.permissions);
+  return options;
+}
+
+void addRequestOptions(CommandLine& line, CLI::App* command) {
   addText(command, "--app-id", line.appID, "ID", "the application's ID at Facebook");
   addText(command, "--permissions", line.permissions, "A,B", "names of permissions, between commas");
   addText(command, "--audience", line.audience, "WHO", "everyone, friends or only_me");
+}
+
+void addRequestCommand(CommandLine& line) {
+  CLI::App* command = addCommand(
+      line, &line.app, "request", "Ask for access, as an application does", [&line](Session& session) {
+        return requestAccess(session, line.as, requestOptions(line));
+      });
+  addText(command, "--as", line.as, "APP_ID", "ask as this installed application");
+  addRequestOptions(line, command);
+}
+
+void addExplainCommand(CommandLine& line) {
+  CLI::App* command = addCommand(
+      line, &line.app, "explain", "Show what a request would come to, and why", [&line](Session& session) {
+        return explainAccess(
+            session, *line.subject, {requestOptions(line), line.language.value_or(""), line.online});
+      });
+  addSubject(line, command, "CLIENT", "the application's ID");
+  addRequestOptions(line, command);
+  addText(command, "--language", line.language, "LANG", "the language of the alert, such as de (yours)");
+  command->add_flag("--online", line.online, "have the server describe unknown permissions");
 }
 
 void addAccessCommand(CommandLine& line) {
@@ -243,6 +265,7 @@ ExitStatus parseAndRun(int argc, const char* const* argv, Session& session) {
   addAccountCommands(line);
   addRequestCommand(line);
   addAccessCommand(line);
+  addExplainCommand(line);
   addAuthorizationCommands(line);
   addLogCommand(line);
   addPreferenceCommands(line);

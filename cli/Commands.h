@@ -45,6 +45,9 @@ struct LogFilter {
 };
 ExitStatus showAccessLog(Session& session, const LogFilter& filter);
 
+// explain. Refused where the request would be refused at once.
+ExitStatus explainAccess(Session& session, const std::string& clientID, const ExplainOptions& options);
+
 // preference. valueText: JSON, or a text that is no JSON as it is.
 ExitStatus getPreference(Session& session, const std::string& applicationID, const std::string& key);
 ExitStatus setPreference(Session& session,

@@ -67,6 +67,14 @@ Decision decisionFrom(const std::tuple<bool, Dictionary>& answer) {
   return decision;
 }
 
+Dictionary dictionaryOf(const RequestOptions& options) {
+  Dictionary sent;
+  if (options.appID) sent.emplace("app_id", *options.appID);
+  if (options.permissions) sent.emplace("permissions", *options.permissions);
+  if (options.audience) sent.emplace("audience", *options.audience);
+  return sent;
+}
+
 }  // namespace
 
 // Listens to no signal: it is never registered for any.
@@ -115,11 +123,8 @@ base::Result<void> Service::registerAs(const std::string& appID) {
 }
 
 base::Result<Decision> Service::requestAccess(const RequestOptions& options) {
-  Dictionary sent;
-  if (options.appID) sent.emplace("app_id", *options.appID);
-  if (options.permissions) sent.emplace("permissions", *options.permissions);
-  if (options.audience) sent.emplace("audience", *options.audience);
-  return call([&](Proxy& rvd) { return decisionFrom(rvd.RequestAccess(kAccountType, sent, true)); });
+  return call(
+      [&](Proxy& rvd) { return decisionFrom(rvd.RequestAccess(kAccountType, dictionaryOf(options), true)); });
 }
 
 base::Result<Json> Service::access() {
@@ -167,6 +172,14 @@ base::Result<void> Service::forgetRefusal(const std::string& clientID) {
 
 base::Result<Json> Service::accessLog(std::uint32_t limit) {
   return call([&](Proxy& rvd) { return documentOf(rvd.ListAccessLog(limit)); });
+}
+
+base::Result<Json> Service::explain(const std::string& clientID, const ExplainOptions& options) {
+  Dictionary sent = dictionaryOf(options.request);
+  if (options.online) sent.emplace("online", true);
+  return call([&](Proxy& rvd) {
+    return jsonFrom(rvd.ExplainAccess(kAccountType, clientID, sent, options.language));
+  });
 }
 
 base::Result<Json> Service::preference(const std::string& applicationID, const std::string& key) {

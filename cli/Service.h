@@ -35,6 +35,13 @@ struct RequestOptions {
   std::optional<std::string> audience;
 };
 
+// A request to be explained.
+struct ExplainOptions {
+  RequestOptions request;
+  std::string language;  // empty: the user's
+  bool online = false;   // the server may be asked to describe permissions
+};
+
 // Every call waits for its answer without a limit. Documents have the keys of the bus interfaces. A failure's
 // message says in words what went wrong and what to do; its kind is kRefused where the caller has no access
 // to what it asked for.
@@ -62,6 +69,7 @@ class Service {
   base::Result<Decision> revokeAll();
   base::Result<void> forgetRefusal(const std::string& clientID);
   base::Result<Json> accessLog(std::uint32_t limit);
+  base::Result<Json> explain(const std::string& clientID, const ExplainOptions& options);
 
   base::Result<Json> preference(const std::string& applicationID, const std::string& key);  // null: not set
   base::Result<void> setPreference(const std::string& applicationID,

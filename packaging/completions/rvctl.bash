@@ -10,7 +10,7 @@ _rvctl_accounts() {
 
 _rvctl() {
   local current=${COMP_WORDS[COMP_CWORD]} previous=${COMP_WORDS[COMP_CWORD - 1]}
-  local commands="account request access list authorize revoke forget log preference agent"
+  local commands="account request access explain list authorize revoke forget log preference agent"
   local command="" word words=""
   for word in "${COMP_WORDS[@]:1:COMP_CWORD-1}"; do
     [[ $word == -* ]] && continue
@@ -28,7 +28,7 @@ _rvctl() {
       mapfile -t COMPREPLY < <(compgen -W "$(_rvctl_clients)" -- "$current")
       return
       ;;
-    --as | --app-id | --permissions | --token-fd | --credential-fd | --limit | --since | --until | --application)
+    --as | --app-id | --permissions | --token-fd | --credential-fd | --limit | --since | --until | --application | --language)
       return
       ;;
   esac
@@ -40,6 +40,7 @@ _rvctl() {
     "account remove") words="--json $(_rvctl_accounts)" ;;
     request) words="--json --as --app-id --permissions --audience" ;;
     access) words="--json --as --credential-fd" ;;
+    explain) words="--json --app-id --permissions --audience --language --online $(_rvctl_clients)" ;;
     authorize | forget) words="--json $(_rvctl_clients)" ;;
     revoke) words="--json --all $(_rvctl_clients)" ;;
     log) words="--json --client --since --until --limit" ;;

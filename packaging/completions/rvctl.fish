@@ -8,7 +8,7 @@ function __rvctl_accounts
     rvctl account list --json 2>/dev/null | string replace -rf '^ *"id": "([A-Za-z0-9._-]*)",?$' '$1'
 end
 
-set -l commands account request access list authorize revoke forget log preference agent
+set -l commands account request access explain list authorize revoke forget log preference agent
 set -l none "not __fish_seen_subcommand_from $commands"
 
 complete -c rvctl -f
@@ -16,6 +16,7 @@ complete -c rvctl -s h -l help -d 'Print help'
 complete -c rvctl -n $none -a account -d 'Add, list and remove accounts'
 complete -c rvctl -n $none -a request -d 'Ask for access, as an application does'
 complete -c rvctl -n $none -a access -d 'Show what access an application holds'
+complete -c rvctl -n $none -a explain -d 'Show what a request would come to, and why'
 complete -c rvctl -n $none -a list -d 'List the applications that were granted or refused'
 complete -c rvctl -n $none -a authorize -d 'Grant an application access, without asking'
 complete -c rvctl -n $none -a revoke -d "Take an application's access away"
@@ -37,11 +38,13 @@ complete -c rvctl -n '__fish_seen_subcommand_from preference' -l application -x 
 complete -c rvctl -n '__fish_seen_subcommand_from preference; and __fish_seen_subcommand_from get set reset' -a TKFacebookIgnoreAccessRequests
 
 complete -c rvctl -n '__fish_seen_subcommand_from request access' -l as -x -d 'The installed application that asks'
-complete -c rvctl -n '__fish_seen_subcommand_from request' -l app-id -x -d 'The ID at Facebook'
-complete -c rvctl -n '__fish_seen_subcommand_from request' -l permissions -x -d 'Names between commas'
-complete -c rvctl -n '__fish_seen_subcommand_from request' -l audience -x -a 'everyone friends only_me' -d 'Who sees posts'
+complete -c rvctl -n '__fish_seen_subcommand_from request explain' -l app-id -x -d 'The ID at Facebook'
+complete -c rvctl -n '__fish_seen_subcommand_from request explain' -l permissions -x -d 'Names between commas'
+complete -c rvctl -n '__fish_seen_subcommand_from request explain' -l audience -x -a 'everyone friends only_me' -d 'Who sees posts'
+complete -c rvctl -n '__fish_seen_subcommand_from explain' -l language -x -d 'The language of the alert'
+complete -c rvctl -n '__fish_seen_subcommand_from explain' -l online -d 'Have the server describe unknown permissions'
 complete -c rvctl -n '__fish_seen_subcommand_from access' -l credential-fd -x -d 'Write its token to this descriptor'
-complete -c rvctl -n '__fish_seen_subcommand_from authorize revoke forget' -a '(__rvctl_clients)'
+complete -c rvctl -n '__fish_seen_subcommand_from explain authorize revoke forget' -a '(__rvctl_clients)'
 complete -c rvctl -n '__fish_seen_subcommand_from revoke' -l all -d 'Of every application'
 complete -c rvctl -n '__fish_seen_subcommand_from log' -l client -x -a '(__rvctl_clients)' -d 'Of this application alone'
 complete -c rvctl -n '__fish_seen_subcommand_from log' -l since -x -d 'From this day or time on'

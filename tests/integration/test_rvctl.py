@@ -290,6 +290,51 @@ def test_the_reason_of_a_refusal_is_shown_with_nothing_hidden_in_it(tools, rvd):
     assert tools.json("request")[1]["error"]["description"] == "a\x1b[2J\u202eb\nc"
 
 
+# ---- explain ----
+
+ALERT = ("header", "message", "default_button_title", "alternate_button_title")
+
+
+def explanation(**entries):
+    return GLib.Variant("(a{sv})", (entries,))
+
+
+def test_an_explanation_is_asked_for_with_what_was_given(tools, rvd):
+    rvd.answers["ExplainAccess"] = explanation(decision=text("granted"), reason=text("It holds it."))
+    tools.run("explain", "org.example.A")
+    tools.run(
+        "explain", "org.example.A", "--app-id", "4711", "--permissions", "email,user_likes",
+        "--audience", "friends", "--language", "de", "--online",
+    )  # fmt: skip
+    options = {"app_id": "4711", "permissions": ["email", "user_likes"], "audience": "friends", "online": True}
+    assert [call.values for call in rvd.calls] == [
+        (FACEBOOK, "org.example.A", {}, ""), (FACEBOOK, "org.example.A", options, "de"),
+    ]  # fmt: skip
+
+
+@pytest.mark.parametrize(
+    "decision, status, shown",
+    [("granted", DONE, "granted at once"), ("refused", REFUSED, "refused at once"), ("would_ask", DONE, "would ask")],
+)
+def test_an_explanation_ends_as_the_request_would(tools, rvd, decision, status, shown):
+    line = "debug: A line [of it]. [file:1 -[Class method:]]"
+    entries = {
+        "decision": text(decision), "reason": text("For a reason."), "ignored": GLib.Variant("b", False),
+        "error": GLib.Variant("a{sv}", access_error(7)), "log": GLib.Variant("as", [line, line]),
+    }  # fmt: skip
+    rvd.answers["ExplainAccess"] = explanation(**entries)
+    outcome = tools.run("explain", "org.example.A")
+    assert outcome.status == status
+    lines = outcome.out.splitlines()
+    assert lines[0].startswith(f"decision     {shown}")
+    assert lines[1:] == [
+        "reason       For a reason.", "error        com.zentor.accounts, code 7",
+        "log          debug: A line [of it].", "             debug: A line [of it].",
+    ]  # fmt: skip
+    document = {key: value.unpack() for key, value in entries.items()}
+    assert tools.json("explain", "org.example.A") == (status, document)
+
+
 # ---- access ----
 
 
@@ -610,6 +655,7 @@ COMMANDS = {
     "request --as": (["request", "--as", "org.example.A"], "Register"),
     "access": (["access"], "GetAccess"),
     "access --as": (["access", "--as", "org.example.A"], "Register"),
+    "explain": (["explain", "org.example.A"], "ExplainAccess"),
     "list": (["list"], "ListAuthorizations"),
     "authorize": (["authorize", "org.example.A"], "AuthorizeAccess"),
     "revoke": (["revoke", "org.example.A"], "RevokeAccess"),
@@ -724,6 +770,8 @@ def test_output_that_cannot_be_written_is_no_success(tools, rvd):
         ["request", "--app-id"],
         ["request", "--answer", "allow"],
         ["agent", "--answer", "allow"],
+        ["explain"],
+        ["explain", "org.example.A", "--online", "yes"],
         ["authorize"],
         ["revoke"],
         ["revoke", "org.example.A", "--all"],
@@ -796,11 +844,20 @@ def test_a_hostile_text_is_shown_on_its_line_and_comes_unchanged_in_json(tools, 
         "(sasa{sv})", (hostile, [hostile], {hostile: text(hostile), "b": GLib.Variant("as", [hostile])})
     )
     rvd.answers["AddAccount"] = GLib.Variant("(s)", (hostile,))
+    rvd.answers["ExplainAccess"] = explanation(
+        decision=text("would_ask"),
+        **{key: text(hostile) for key in ("reason", *ALERT)},
+        error=GLib.Variant("a{sv}", {"domain": text(hostile), "description": text(hostile)}),
+        new_permissions=GLib.Variant("as", [hostile]),
+        server_request=GLib.Variant("a{sv}", {"exchange": text(hostile), "permissions": GLib.Variant("as", [hostile])}),
+        log=GLib.Variant("as", [hostile]),
+    )
     for arguments, lines in (
         (["account", "list"], 2),
         (["list"], 2),
         (["log"], 2),
         (["access"], 4),
+        (["explain", "org.example.A"], 11),
         (["account", "add", "ada"], 1),
     ):
         outcome = tools.run(*arguments, stdin=b"token")
