@@ -199,13 +199,27 @@ void ManagementService::revoke(Call& call,
     finish(*begun);
     throw;
   }
+  const auto erased = isDone() ? eraseCredentials(intent) : base::Result<void>();
   // One that failed is crossed out as well: its caller hears of it, and what is granted from then on must
   // not be undone by the next start.
   finish(*begun);
+  if (!erased) throwFailure(erased.failure());
   if (!parts_.accounts.listOfType(intent.accountType).empty() && !isDone())
     throw sdbus::Error(kFailed, "The revocation could not be written down; try again");
   barrier.reset();  // whoever is answered may ask again at once
   if (decision) answerDecision(call, decision->first, decision->second);
+}
+
+// Plug-ins delete the credentials of those that they find records of. A request that became void may have
+// stored one that no record stands for.
+base::Result<void> ManagementService::eraseCredentials(const records::Intent& intent) {
+  std::optional<std::string> clientID;
+  if (intent.kind == records::Intent::Kind::kRevokeClient) clientID = intent.subject;
+  for (const auto& account : parts_.accounts.listOfType(intent.accountType)) {
+    auto erased = parts_.keychain.eraseClients(account.identifier, clientID);
+    if (!erased) return erased;
+  }
+  return {};
 }
 
 void ManagementService::finish(std::int64_t intent) {

@@ -47,6 +47,7 @@ class ManagementService {
               const Revocation& revocation,
               const std::function<bool()>& isDone,
               std::optional<requests::RequestTable::Barrier> barrier);
+  base::Result<void> eraseCredentials(const records::Intent& intent);
   void finish(std::int64_t intent);
   void forgetRefusal(SharedCall call);
   void listAccessLog(SharedCall call);

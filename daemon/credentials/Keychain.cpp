@@ -140,6 +140,19 @@ std::shared_ptr<const RVAccountCredential> Keychain::credentialForClient(const s
   return isGranted(place) ? credential : nullptr;
 }
 
+base::Result<void> Keychain::eraseClients(const std::string& accountId,
+                                          const std::optional<std::string>& clientId) {
+  const std::lock_guard lock(mutex_);
+  if (clientId) return store_.remove({accountId, clientId});
+  const auto places = store_.places();
+  if (!places) return places.failure();
+  for (const Place& place : *places) {
+    if (place.accountId != accountId || !place.clientId) continue;
+    if (auto removed = store_.remove(place); !removed) return removed;
+  }
+  return {};
+}
+
 base::Result<void> Keychain::eraseAccount(const std::string& accountId) {
   const std::lock_guard lock(mutex_);
   const auto places = store_.places();

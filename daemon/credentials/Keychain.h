@@ -41,6 +41,10 @@ class Keychain : public RVDKeychainManager {
   std::shared_ptr<const RVAccountCredential> credentialForClient(const std::string& accountId,
                                                                  const std::string& clientId);
 
+  // Deletes the client's credential, or, where none is named, that of every client of the account; also what
+  // no record stands for, as a request that became void may have stored it.
+  base::Result<void> eraseClients(const std::string& accountId, const std::optional<std::string>& clientId);
+
   // Deletes every credential of the account, its own included. Called once the account is gone.
   base::Result<void> eraseAccount(const std::string& accountId);
 
