@@ -4,8 +4,10 @@
 #include <condition_variable>
 #include <cstdint>
 #include <deque>
+#include <exception>
 #include <map>
 #include <mutex>
+#include <string>
 #include <system_error>
 #include <thread>
 #include <utility>
@@ -73,6 +75,7 @@ struct Inspections::Shared : std::enable_shared_from_this<Shared> {
   void deliver(std::unique_lock<std::mutex>& lock, Inspected inspected, Inspection result);
   bool startThread();
 
+  Inspection inspectSafely(pid_t pid) const;
   void runThread();
   void watch();
 
@@ -113,6 +116,14 @@ bool Inspections::Shared::startThread() {
   }
 }
 
+Inspection Inspections::Shared::inspectSafely(pid_t pid) const {
+  try {
+    return inspect(pid);
+  } catch (const std::exception& exception) {  // there is no memory left, for example
+    return unknown(std::string("its process could not be looked at: ") + exception.what());
+  }
+}
+
 void Inspections::Shared::runThread() {
   std::unique_lock lock(mutex);
   while (!queue.empty() && !isClosed) {
@@ -123,7 +134,7 @@ void Inspections::Shared::runThread() {
     taken->second.runs = true;
     const pid_t pid = taken->second.pid;
     lock.unlock();
-    Inspection result = inspect(pid);
+    Inspection result = inspectSafely(pid);
     lock.lock();
     const auto job = jobs.find(id);
     if (job == jobs.end()) {

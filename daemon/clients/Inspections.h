@@ -21,7 +21,8 @@ struct Inspection {
   std::optional<InstalledApplication> application;  // the one that its sandbox or its unit says it is
 };
 
-// Looks at the process that has the number. May wait without limit; does not throw.
+// Looks at the process that has the number. May wait without limit. Where it
+// throws, the process is unknown.
 using Inspect = std::function<Inspection(pid_t pid)>;
 
 // Holds on to the process first, then looks at it, then finds the application among those installed. What

@@ -9,9 +9,18 @@ from gi.repository import GLib
 from harness.agent import ALLOW
 from harness.application import FACEBOOK
 from harness.bus import ACCOUNTS, AGENT_MANAGER, MANAGEMENT, BusError
-from harness.expect import ACCESS_DENIED, ALREADY_IDENTIFIED, GRANTED, NO_ACCESS, UNKNOWN_APPLICATION, bus_error
+from harness.expect import (
+    ACCESS_DENIED,
+    ACCOUNTS_DOMAIN,
+    ALREADY_IDENTIFIED,
+    GRANTED,
+    NO_ACCESS,
+    UNKNOWN_APPLICATION,
+    bus_error,
+)
 from harness.sandbox import (
     ORDINARY,
+    Unit,
     behind_bare_proxy,
     bwrap,
     marker_of,
@@ -100,6 +109,72 @@ def test_an_application_that_runs_in_a_sandbox_is_no_other_program(world):
         assert "sandbox" in error.message
 
 
+def test_what_a_request_carries_says_nothing_about_who_asks(world):
+    world.manager().add_account()
+    agent = world.agent()
+    claims = {name: GLib.Variant("s", OTHER) for name in ("client_id", "id", "name", "bundle_id", "evidence", "desktop_id")}
+    claims |= {name: GLib.Variant("u", 1) for name in ("pid", "uid", "ProcessID", "UnixUserID")}
+    pending = sandboxed(world, PHOTO).start_request(["email"], app_id=OTHER, **claims)
+    alert = agent.next()
+    assert (alert.description["client_id"], alert.description["evidence"]) == (PHOTO, "sandbox")
+    assert OTHER not in alert.message
+    alert.refuse()
+    pending.answer()
+
+
+def test_what_a_sandboxed_application_was_granted_is_not_its_namesakes(world):
+    world.manager().add_account()
+    agent = world.agent(answer=ALLOW)
+    application = sandboxed(world, PHOTO)
+    assert application.request(["email"]) == GRANTED
+    token = application.token()
+    namesake = world.application(PHOTO)
+    assert namesake.access() == ("none", [], {})
+    with bus_error(NO_ACCESS):
+        namesake.credential()
+    assert namesake.request(["email"])[0] is False
+    assert agent.shown[-1].description["evidence"] != "sandbox"
+    assert application.token() == token
+
+
+def test_a_program_that_the_session_started_as_an_application_is_that_one(world):
+    world.install(PHOTO, "Photo App")
+    world.manager().add_account()
+    agent = world.agent()
+    unit = Unit(world, f"app-gnome-{PHOTO}-4711.scope")
+    application = unit.program()
+    pending = application.start_request(["email"])
+    alert = agent.next()
+    assert (alert.description["client_id"], alert.description["evidence"]) == (PHOTO, "scope")
+    alert.allow()
+    assert pending.answer() == GRANTED
+    with bus_error(ALREADY_IDENTIFIED):
+        application.register(PHOTO)
+    assert application.connection.call(MANAGEMENT, "ListAccounts")
+    assert standing(world, unit.program("below")) == "unconfined"
+
+
+@pytest.mark.parametrize("others", [None, "X-Flatpak=org.example.PhotoApp\n"], ids=["not installed", "in a sandbox"])
+def test_a_unit_is_no_evidence_of_an_application_that_it_cannot_be(world, others):
+    if others:
+        world.install(PHOTO, others=others)
+    assert standing(world, Unit(world, f"app-{PHOTO}-1.scope").program()) == "unconfined"
+
+
+def test_an_unknown_program_is_granted_nothing_and_leaves_nothing(world):
+    manager = world.manager()
+    manager.add_account()
+    agent = world.agent(answer=ALLOW)
+    application = behind_bare_proxy(world)
+    granted, error = application.request(["email"])
+    assert (granted, error["domain"], error["code"]) == (False, ACCOUNTS_DOMAIN, 16)
+    assert "client_id" not in agent.shown[0].description
+    assert agent.shown[0].description["evidence"] == "unknown"
+    assert application.access() == ("none", [], {})
+    assert error_of(application, ACCOUNTS, "GetCredential", GLib.Variant("(s)", (FACEBOOK,))) == NO_ACCESS
+    assert not manager.authorizations()
+
+
 def test_a_program_behind_a_bare_proxy_is_unknown(world):
     world.install(PHOTO)
     application = behind_bare_proxy(world)
@@ -164,21 +239,27 @@ def methods():
                 yield interface.get("name"), method.get("name"), f"({', '.join(arguments)}{',' * (len(arguments) == 1)})"
 
 
+UNCONFINED = ("unconfined", "registered", "in a unit")
+
+
 def expectation(kind, interface, method):
     """The error that the call must be answered with, or None where it must not be AccessDenied."""
     if kind == "another user":
         return ACCESS_DENIED
-    unconfined = kind in ("unconfined", "registered")
+    unconfined = kind in UNCONFINED
     if interface in (MANAGEMENT, AGENT_MANAGER):
         return None if unconfined else ACCESS_DENIED
     if method == "Register":
-        return {"unconfined": None, "registered": ALREADY_IDENTIFIED, "sandboxed": ALREADY_IDENTIFIED}.get(
-            kind, ACCESS_DENIED
-        )
+        if kind == "unconfined":
+            return None
+        return ALREADY_IDENTIFIED if kind in ("registered", "in a unit", "sandboxed") else ACCESS_DENIED
     return None
 
 
 def caller(world, kind):
+    if kind == "in a unit":
+        world.install(OTHER)
+        return Unit(world, f"app-gnome-{OTHER}-1.scope").program()
     if kind == "another user":
         if os.geteuid() != 0:
             pytest.skip("only root can speak as another user")
@@ -198,7 +279,9 @@ def caller(world, kind):
     return program(world, ["unshare", "-Ur"])
 
 
-KINDS = ["another user", "unconfined", "registered", "sandboxed", "behind a bare proxy", "in a foreign namespace"]
+KINDS = [
+    "another user", "unconfined", "registered", "in a unit", "sandboxed", "behind a bare proxy", "in a foreign namespace",
+]  # fmt: skip
 
 
 @pytest.mark.parametrize("kind", KINDS)
@@ -214,7 +297,7 @@ def test_every_method_is_for_those_whom_it_is_for(world, kind):
         if (error != expected) if expected else (error == ACCESS_DENIED):
             wrong.append(f"{interface}.{method}{arguments}: {error}, not {expected}")
     assert not wrong, "\n".join(wrong)
-    if kind not in ("unconfined", "registered"):
+    if kind not in UNCONFINED:
         assert world.manager().accounts() == []
 
 

@@ -95,6 +95,13 @@ TEST(AnInspection, IsNotBegunWhereAllThatRunWereGivenUp) {
   while (begin(inspections, 100).get().facts.confinement == Confinement::kUnknown) std::this_thread::yield();
 }
 
+TEST(AnInspection, ThatThrowsLeavesItsProcessUnknown) {
+  Inspections inspections([](pid_t) -> Inspection { throw std::runtime_error("no memory"); }, 5min, 1);
+  const auto result = begin(inspections, 1).get();
+  EXPECT_EQ(result.facts.confinement, Confinement::kUnknown);
+  EXPECT_NE(result.facts.reason.find("no memory"), std::string::npos);
+}
+
 TEST(AnInspection, ThatNoThreadTakesInTimeIsGivenUp) {
   const auto gate = std::make_shared<Gate>();
   Inspections inspections(throughGate(gate), 50ms, 1);

@@ -167,3 +167,45 @@ def behind_bare_proxy(world):
 def program(world, wrapper=(), **others):
     """A program of the user's own, started by the command."""
     return Application(CallingProgram(world, wrapper, **others))
+
+
+class Unit:
+    """A unit of the user's service manager, as far as a control group's name makes one. Only root can make it, where
+    no service manager keeps these groups for itself."""
+
+    def __init__(self, world, name):
+        if os.geteuid() != 0:
+            pytest.skip("only root can make control groups")
+        self._world = world
+        self._mount = world.folder("cgroup")
+        command = ["mount", "-t", "cgroup", "-o", "none,name=systemd", "cgroup", self._mount]
+        if subprocess.run(command, stderr=subprocess.DEVNULL, check=False).returncode != 0:
+            pytest.skip("the system does not let its control groups be mounted")
+        user = os.geteuid()
+        self._path = f"user.slice/user-{user}.slice/user@{user}.service/app.slice/{name}"
+        os.makedirs(os.path.join(self._mount, self._path))
+        self._programs = []
+        world.keep(self)
+
+    def program(self, below=""):
+        """A program in the unit, or in a group below it."""
+        group = os.path.join(self._mount, self._path, below)
+        os.makedirs(group, exist_ok=True)
+        enter = ["sh", "-c", 'echo $$ > "$0" && exec "$@"', os.path.join(group, "cgroup.procs")]
+        started = program(self._world, enter)
+        self._programs.append((started, group))
+        return started
+
+    def dispose(self):
+        for started, group in self._programs:
+            started.connection.close()
+            if group != os.path.join(self._mount, self._path, ""):
+                os.rmdir(group)
+        path = self._path
+        while path:
+            try:
+                os.rmdir(os.path.join(self._mount, path))
+            except OSError:
+                break  # what was there before
+            path = os.path.dirname(path)
+        subprocess.run(["umount", self._mount], check=True)
