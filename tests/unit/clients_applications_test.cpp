@@ -135,6 +135,30 @@ TEST_F(TheInstalledApplications, AreLookedForInLinkedDirectoriesWithoutGoingRoun
   EXPECT_EQ(nameOf("a-a-b"), "B");
 }
 
+TEST_F(TheInstalledApplications, BelongToASandboxWhereAnyEntryOfTheirIDSaysSo) {
+  install("app.desktop", entry("App"));
+  EXPECT_FALSE(find("app")->belongsToSandbox);
+  installAtHome("app.desktop", entry("The user's"));
+  for (const char* key : {"X-Flatpak=app\n", "X-SnapInstanceName=app\n"}) {
+    install("app.desktop", entry("App", key));
+    EXPECT_TRUE(find("app")->belongsToSandbox) << key;
+    EXPECT_EQ(nameOf("app"), "The user's");
+  }
+  install("app.desktop", entry("App", "[Desktop Action x]\nX-Flatpak=app\n"));
+  EXPECT_FALSE(find("app")->belongsToSandbox);
+}
+
+TEST_F(TheInstalledApplications, BelongToASandboxWhereOneInstallsItsOwn) {
+  for (const char* place : {"lib/flatpak/exports/share", "lib/snapd/desktop"}) {
+    directory_.write(std::string(place) + "/applications/app.desktop", entry("App"));
+    for (const char* slash : {"", "/"}) {
+      const auto found = InstalledApplications({directory_.path(place) + slash}, {}).find("app");
+      ASSERT_TRUE(found);
+      EXPECT_TRUE(found->belongsToSandbox) << place;
+    }
+  }
+}
+
 TEST(TheDataDirectories, AreTheUsersOwnAndThenTheSystems) {
   using Directories = std::vector<std::string>;
   EXPECT_EQ(clients::dataDirectories("", "/home/u", ""),
