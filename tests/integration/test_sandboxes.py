@@ -77,7 +77,8 @@ def test_who_asks_and_how_that_is_known_stands_beside_the_words_of_the_alert(wor
     world.install(OTHER, "Sandbox")
     world.manager().add_account()
     agent = world.agent()
-    for application, evidence in ((sandboxed(world, PHOTO), "sandbox"), (world.application(OTHER, "Other"), "registered")):
+    clients = ((sandboxed(world, PHOTO), "sandbox"), (world.application(OTHER, "Other"), "registered"))
+    for application, evidence in clients:
         pending = application.start_request(["email"])
         alert = agent.next()
         words = [text for key, text in alert.description.items() if key in ("header", "message")]
@@ -112,7 +113,8 @@ def test_an_application_that_runs_in_a_sandbox_is_no_other_program(world):
 def test_what_a_request_carries_says_nothing_about_who_asks(world):
     world.manager().add_account()
     agent = world.agent()
-    claims = {name: GLib.Variant("s", OTHER) for name in ("client_id", "id", "name", "bundle_id", "evidence", "desktop_id")}
+    names = ("client_id", "id", "name", "bundle_id", "evidence", "desktop_id")
+    claims = {name: GLib.Variant("s", OTHER) for name in names}
     claims |= {name: GLib.Variant("u", 1) for name in ("pid", "uid", "ProcessID", "UnixUserID")}
     pending = sandboxed(world, PHOTO).start_request(["email"], app_id=OTHER, **claims)
     alert = agent.next()
@@ -204,8 +206,9 @@ def test_a_sandbox_that_does_not_say_which_application_it_is_for_is_unknown(worl
 def test_what_a_program_is_called_in_its_own_view_of_the_files_does_not_matter(world):
     need_user_namespaces()
     # A file of the program's own lies over a trusted program's in its own mounts.
-    over = ["unshare", "-Urm", "sh", "-c", 'mount --bind /usr/bin/python3 /usr/bin/busctl && shift && exec "$@"', "sh", "-"]
-    application = program(world, over)
+    script = 'mount --bind /usr/bin/python3 /usr/bin/busctl && shift && exec /usr/bin/busctl "$@"'
+    application = program(world, ["unshare", "-Urm", "sh", "-c", script, "sh"])
+    assert os.readlink(f"/proc/{application.connection.process.pid}/exe") == "/usr/bin/busctl"
     assert standing(world, application) == "unknown"
 
 
@@ -223,7 +226,9 @@ def test_a_program_that_does_not_let_itself_be_looked_at_is_unknown(bare_world, 
 
 def methods():
     """Every method of every interface that rvd offers, with arguments that it takes."""
-    values = {"s": "''", "o": "objectpath '/a'", "b": "false", "u": "uint32 1", "v": "<1>", "h": "handle 0", "a{sv}": "@a{sv} {}"}
+    values = {
+        "s": "''", "o": "objectpath '/a'", "b": "false", "u": "uint32 1", "v": "<1>", "h": "handle 0", "a{sv}": "@a{sv} {}",
+    }  # fmt: skip
     texts = {"account_type": f"'{FACEBOOK}'", "kind": "'desktop'"}
     for name in ("Accounts1", "Agent1", "Management1"):
         tree = xml.etree.ElementTree.parse(os.path.join(INTERFACES, f"com.zentor.rvd.{name}.xml"))
