@@ -9,14 +9,16 @@
 #include <stdexcept>
 #include <string>
 
-// Runs a session bus that nobody else knows of; it ends with the object.
+#include "tests/support/TemporaryDirectory.h"
+
+// Runs a session bus that nobody else knows of, and that starts no services; it ends with the object.
 class PrivateBus {
  public:
   PrivateBus() {
     int ends[2];
     if (::pipe(ends) != 0) throw std::runtime_error("no pipe for the bus's address");
     std::string program = "dbus-daemon";
-    std::string configuration = "--session";
+    std::string configuration = "--config-file=" + directory_.write("bus.conf", kConfiguration);
     std::string stay = "--nofork";
     std::string print = "--print-address=" + std::to_string(ends[1]);
     char* const arguments[] = {program.data(), configuration.data(), stay.data(), print.data(), nullptr};
@@ -36,6 +38,12 @@ class PrivateBus {
   const std::string& address() const { return address_; }
 
  private:
+  static constexpr const char* kConfiguration =
+      "<busconfig><type>session</type><listen>unix:tmpdir=/tmp</listen><auth>EXTERNAL</auth>"
+      "<policy context=\"default\"><allow send_destination=\"*\" eavesdrop=\"true\"/>"
+      "<allow eavesdrop=\"true\"/><allow own=\"*\"/></policy></busconfig>";
+
+  const support::TemporaryDirectory directory_;
   pid_t process_ = 0;
   std::string address_;
 };
