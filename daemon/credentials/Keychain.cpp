@@ -1,7 +1,8 @@
 #include "daemon/credentials/Keychain.h"
 
-#include <functional>
+#include <algorithm>
 #include <utility>
+#include <vector>
 
 #include "daemon/log/Log.h"
 #include "daemon/records/Account.h"
@@ -15,20 +16,6 @@ using records::Connection;
 std::shared_ptr<requests::RequestContext> requestOf(const RVAccount& account) {
   const auto* ours = dynamic_cast<const records::Account*>(&account);
   return ours != nullptr ? ours->request() : nullptr;
-}
-
-// Writes for the request that the account object was handed out for.
-std::optional<RVError> writeFor(const RVAccount& account, const std::function<base::Result<void>()>& write) {
-  const auto request = requestOf(account);
-  std::optional<base::Result<void>> result;
-  if (request == nullptr) {
-    result = write();
-  } else {
-    request->unlessVoid([&] { result = write(); });
-  }
-  if (!result) return records::storageError(records::kRequestIsVoid);
-  if (!*result) return records::storageError(result->failure().message);
-  return std::nullopt;
 }
 
 RVError withoutClientId() {
@@ -53,28 +40,37 @@ base::Result<Keychain::Standing> Keychain::standing(const Place& place) {
   Standing standing;
   const auto done = database_.read([&](Connection& connection) -> base::Result<void> {
     auto statement = connection.prepare(
-        "SELECT authorizations.granted FROM accounts LEFT JOIN authorizations ON authorizations.account_type "
-        "= accounts.account_type AND authorizations.client_id = ?2 WHERE accounts.identifier = ?1");
+        "SELECT accounts.state = 1, authorizations.granted, authorizations.evidence, "
+        "undeleted_credentials.account IS NOT NULL FROM accounts "
+        "LEFT JOIN authorizations ON authorizations.account_type = accounts.account_type "
+        "AND authorizations.client_id = ?2 "
+        "LEFT JOIN undeleted_credentials ON undeleted_credentials.account = accounts.identifier "
+        "AND undeleted_credentials.client_id = ?2 WHERE accounts.identifier = ?1");
     if (!statement) return statement.failure();
     const auto row = (*statement)->bind(place.accountId).bind(place.clientId).step();
     if (!row) return row.failure();
-    standing = {*row, *row && (*statement)->number(0) == 1};
+    if (!*row) return {};
+    standing = {!place.clientId || (*statement)->number(0) != 0,
+                (*statement)->number(1) != 0,
+                (*statement)->number(3) != 0,
+                static_cast<clients::Evidence>((*statement)->number(2))};
     return {};
   });
   if (!done) return done.failure();
   return standing;
 }
 
-bool Keychain::isGranted(const Place& place) {
+bool Keychain::mayBeRead(const Place& place, bool onlyGranted) {
   const auto found = standing(place);
   if (!found)
     logging::error(log_,
-                   "Whether the client %@ holds a grant cannot be read: %@",
-                   {RVValue(place.clientId.value_or("")), RVValue(found.failure().message)});
-  return found && found->isGranted;
+                   "Whether the credential of account %@, %@, may be read cannot be found out: %@",
+                   {RVValue(place.accountId), ownerOf(place), RVValue(found.failure().message)});
+  return found && found->isOfAnAccount && !found->isDeleted && (found->isGranted || !onlyGranted);
 }
 
-std::shared_ptr<const RVAccountCredential> Keychain::read(const Place& place) {
+std::shared_ptr<const RVAccountCredential> Keychain::read(const Place& place, bool onlyGranted) {
+  if (!mayBeRead(place, onlyGranted)) return nullptr;
   auto credential = store_.read(place);
   if (!credential) {
     logging::error(log_,
@@ -82,21 +78,87 @@ std::shared_ptr<const RVAccountCredential> Keychain::read(const Place& place) {
                    {RVValue(place.accountId), ownerOf(place), RVValue(credential.failure().message)});
     return nullptr;
   }
-  if (!*credential) return nullptr;
+  storeHasWorked();
+  // While the store was read, access may have been taken away.
+  if (!*credential || !mayBeRead(place, onlyGranted)) return nullptr;
   return std::make_shared<const RVAccountCredential>(**std::move(credential));
+}
+
+void Keychain::storeHasWorked() {
+  if (!isReconcileOwed_) return;
+  if (const auto done = reconcile(); !done)
+    logging::error(
+        log_, "What is left of deleted credentials stays stored: %@", {RVValue(done.failure().message)});
+}
+
+std::optional<RVError> Keychain::changeFor(const Request& request,
+                                           const Place& place,
+                                           const std::function<base::Result<void>()>& change) {
+  std::optional<base::Result<void>> result;
+  const auto work = [&] {
+    const std::lock_guard lock(changes_);
+    result = checkEvidence(place, request);
+    if (*result) result = change();
+  };
+  if (request == nullptr)
+    work();
+  else
+    request->unlessVoid(work);
+  if (!result) return records::storageError(records::kRequestIsVoid);
+  if (!*result) return records::storageError(result->failure().message);
+  return std::nullopt;
+}
+
+base::Result<void> Keychain::checkEvidence(const Place& place, const Request& request) {
+  if (request == nullptr || request->evidence() == clients::Evidence::kUnknown) return {};
+  const auto found = standing(place);
+  if (!found) return found.failure();
+  const Request writer = writerOf(place);
+  const auto strongest = std::max(found->evidence, writer ? writer->evidence() : clients::Evidence::kUnknown);
+  if (strongest > request->evidence())
+    return base::Failure{base::FailureKind::kRefused,
+                         "what is stored for the client was stored with stronger evidence of who it is"};
+  return {};
 }
 
 base::Result<void> Keychain::store(const Place& place, const RVAccountCredential& credential) {
   const auto found = standing(place);
   if (!found) return found.failure();
   if (!found->isOfAnAccount) return base::Failure{base::FailureKind::kNotFound, "there is no such account"};
-  return store_.write(place, credential);
+  if (auto written = store_.write(place, credential); !written) {
+    isReconcileOwed_ = true;  // it may be there all the same
+    return written;
+  }
+  if (!found->isDeleted) return {};
+  return database_.write([&](Connection& connection) {
+    return connection.run("DELETE FROM undeleted_credentials WHERE account = ?1 AND client_id IS ?2",
+                          place.accountId,
+                          place.clientId);
+  });
+}
+
+base::Result<void> Keychain::remove(const Place& place) {
+  const auto removed = store_.remove(place);
+  if (removed) return {};
+  isReconcileOwed_ = true;
+  if (!place.clientId) return removed;
+  auto noted = database_.write([&](Connection& connection) {
+    return connection.run("INSERT OR IGNORE INTO undeleted_credentials (account, client_id) VALUES (?1, ?2)",
+                          place.accountId,
+                          place.clientId);
+  });
+  if (!noted) return noted;
+  logging::error(log_,
+                 "The credential of account %@, %@, cannot be deleted now: %@. Nobody is handed it any more, "
+                 "and it is deleted later.",
+                 {RVValue(place.accountId), ownerOf(place), RVValue(removed.failure().message)});
+  return {};
 }
 
 std::shared_ptr<const RVAccountCredential> Keychain::credentialForAccount(
     const RVAccount& account,
     const std::optional<std::string>& clientID) {
-  return read({account.identifier(), clientID});
+  return read({account.identifier(), clientID}, false);
 }
 
 std::optional<RVError> Keychain::setCredentialForAccount(const RVAccount& account,
@@ -105,104 +167,140 @@ std::optional<RVError> Keychain::setCredentialForAccount(const RVAccount& accoun
   const auto credential = account.credential();
   if (credential == nullptr) return records::storageError("the account object carries no credential");
   const Place place{account.identifier(), clientID};
-  return writeFor(account, [&] {
-    const std::lock_guard lock(mutex_);
+  const Request request = requestOf(account);
+  auto error = changeFor(request, place, [&] {
     auto stored = store(place, *credential);
-    if (stored) {
-      std::erase_if(writers_, [](const auto& entry) { return entry.second.expired(); });
-      writers_.insert_or_assign(place, requestOf(account));
-    }
+    if (!stored) return stored;
+    const std::lock_guard lock(mutex_);
+    std::erase_if(writers_, [](const auto& entry) { return entry.second.expired(); });
+    writers_.insert_or_assign(place, request);
     return stored;
   });
+  if (!error) storeHasWorked();
+  return error;
 }
 
 std::optional<RVError> Keychain::removeCredentialForAccount(const RVAccount& account,
                                                             const std::optional<std::string>& clientID) {
   if (!clientID) return withoutClientId();
-  return writeFor(account, [&] {
-    const std::lock_guard lock(mutex_);
-    return store_.remove({account.identifier(), clientID});
-  });
+  const Place place{account.identifier(), clientID};
+  return changeFor(requestOf(account), place, [&] { return remove(place); });
 }
 
 base::Result<void> Keychain::setMasterCredential(const std::string& accountId, RVSecret token) {
   const RVAccountCredential credential(std::move(token), RVSecret(), kRVDistantFuture);
-  const std::lock_guard lock(mutex_);
+  const std::lock_guard lock(changes_);
   return store({accountId, std::nullopt}, credential);
 }
 
 std::shared_ptr<const RVAccountCredential> Keychain::credentialForClient(const std::string& accountId,
                                                                          const std::string& clientId) {
-  const Place place{accountId, clientId};
-  if (!isGranted(place)) return nullptr;
-  auto credential = read(place);
-  // While the store was read, the grant may have been taken away.
-  return isGranted(place) ? credential : nullptr;
+  return read({accountId, clientId}, true);
 }
 
 base::Result<void> Keychain::eraseClients(const std::string& accountId,
                                           const std::optional<std::string>& clientId) {
-  const std::lock_guard lock(mutex_);
-  if (clientId) return store_.remove({accountId, clientId});
+  const std::lock_guard lock(changes_);
+  if (clientId) return remove({accountId, clientId});
   const auto places = store_.places();
-  if (!places) return places.failure();
+  if (!places) {
+    // Those of clients with a record are known, and count as deleted already.
+    isReconcileOwed_ = true;
+    logging::error(
+        log_,
+        "Whether the clients of account %@ have left credentials cannot be found out now: %@. They "
+        "are deleted later.",
+        {RVValue(accountId), RVValue(places.failure().message)});
+    return {};
+  }
   for (const Place& place : *places) {
     if (place.accountId != accountId || !place.clientId) continue;
-    if (auto removed = store_.remove(place); !removed) return removed;
+    if (auto removed = remove(place); !removed) return removed;
   }
   return {};
 }
 
-base::Result<void> Keychain::eraseAccount(const std::string& accountId) {
-  const std::lock_guard lock(mutex_);
-  const auto places = store_.places();
-  if (!places) return places.failure();
-  for (const Place& place : *places) {
-    if (place.accountId != accountId) continue;
-    if (auto removed = store_.remove(place); !removed) return removed;
-  }
-  return {};
+void Keychain::eraseAccount(const std::string& accountId) {
+  const auto erase = [&]() -> base::Result<void> {
+    const auto places = store_.places();
+    if (!places) return places.failure();
+    for (const Place& place : *places) {
+      if (place.accountId != accountId) continue;
+      if (auto removed = store_.remove(place); !removed) return removed;
+    }
+    return {};
+  };
+  const std::lock_guard lock(changes_);
+  const auto erased = erase();
+  if (erased) return;
+  isReconcileOwed_ = true;
+  logging::error(log_,
+                 "The credentials of account %@, which is gone, cannot be deleted now: %@. They are deleted "
+                 "later.",
+                 {RVValue(accountId), RVValue(erased.failure().message)});
 }
 
 base::Result<void> Keychain::reconcile() {
-  const std::lock_guard lock(mutex_);
+  const std::lock_guard lock(changes_);
+  auto done = deleteWhatNobodyMayRead();
+  isReconcileOwed_ = !done;
+  return done;
+}
+
+base::Result<void> Keychain::deleteWhatNobodyMayRead() {
   const auto places = store_.places();
   if (!places) return places.failure();
   for (const Place& place : *places) {
     const auto found = standing(place);
     if (!found) return found.failure();
-    if (found->isOfAnAccount && (!place.clientId || found->isGranted)) continue;
+    const bool isInUse = !place.clientId || found->isGranted || writerOf(place) != nullptr;
+    if (found->isOfAnAccount && !found->isDeleted && isInUse) continue;
     if (auto removed = store_.remove(place); !removed) return removed;
-    if (found->isOfAnAccount)
-      logging::notice(log_,
-                      "A credential of account %@ was stored for %@, which holds no grant; it is deleted.",
-                      {RVValue(place.accountId), RVValue(*place.clientId)});
-    else
+    if (!found->isOfAnAccount)
       logging::notice(log_,
                       "A credential was stored for account %@, which is not there; it is deleted.",
                       {RVValue(place.accountId)});
+    else if (found->isDeleted)
+      logging::notice(log_,
+                      "The credential of account %@, %@, could not be deleted before; it is deleted now.",
+                      {RVValue(place.accountId), ownerOf(place)});
+    else
+      logging::notice(log_,
+                      "A credential of account %@ was stored for %@, which holds no grant; it is deleted.",
+                      {RVValue(place.accountId), RVValue(*place.clientId)});
   }
-  return {};
+  return database_.write(
+      [](Connection& connection) { return connection.run("DELETE FROM undeleted_credentials"); });
 }
 
-void Keychain::requestEnded(const std::shared_ptr<requests::RequestContext>& request) {
-  if (request == nullptr) return;
+Keychain::Request Keychain::writerOf(const Place& place) {
   const std::lock_guard lock(mutex_);
-  for (auto entry = writers_.begin(); entry != writers_.end();) {
-    if (entry->second.lock() != request) {
-      ++entry;
-      continue;
-    }
-    const auto found = standing(entry->first);
-    base::Result<void> done;
-    if (!found)
-      done = found.failure();
-    else if (!found->isGranted)
-      done = store_.remove(entry->first);
+  const auto found = writers_.find(place);
+  return found != writers_.end() ? found->second.lock() : nullptr;
+}
+
+void Keychain::requestEnded(const Request& request) {
+  if (request == nullptr) return;
+  std::vector<Place> written;
+  {
+    // Without changes_: a request that has stored nothing ends on the bus thread as well.
+    const std::lock_guard lock(mutex_);
+    for (const auto& [place, writer] : writers_)
+      if (writer.lock() == request) written.push_back(place);
+  }
+  if (written.empty()) return;
+  const std::lock_guard lock(changes_);
+  for (const Place& place : written) {
+    if (writerOf(place) != request) continue;
+    const auto found = standing(place);
+    const auto done = !found             ? base::Result<void>(found.failure())
+                      : found->isGranted ? base::Result<void>()
+                                         : remove(place);
     if (!done)
       logging::error(
           log_, "What a void request has stored cannot be deleted: %@", {RVValue(done.failure().message)});
-    entry = writers_.erase(entry);
+    const std::lock_guard writers(mutex_);
+    writers_.erase(place);
   }
 }
 

@@ -1,6 +1,8 @@
 // Who may store, read and delete which credential.
 #pragma once
 
+#include <atomic>
+#include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -8,6 +10,7 @@
 #include <string>
 
 #include "base/Result.h"
+#include "daemon/clients/Evidence.h"
 #include "daemon/credentials/CredentialStore.h"
 #include "daemon/records/Database.h"
 #include "daemon/requests/RequestContext.h"
@@ -17,8 +20,12 @@
 namespace credentials {
 
 // The daemon's keychain over a store that keeps the credentials. For an account object that was handed out
-// for a request (records::Account), a request that is void has no effect: setting and removing answer an
-// error. Thread-safe.
+// for a request (records::Account), setting and removing answer an error where the request is void, or where
+// a record or another living request of that client has stronger evidence of who the client is. A request
+// whose evidence is unknown is the user's own, whom nothing outranks.
+//
+// A store can be out of reach. What cannot be deleted then counts as deleted: it is written down, read by
+// nobody, and deleted when the store works again. Thread-safe. Only requestEnded is called on the bus thread.
 class Keychain : public RVDKeychainManager {
  public:
   // The database, which holds the accounts and records, the store and the log outlive the keychain.
@@ -45,11 +52,13 @@ class Keychain : public RVDKeychainManager {
   // no record stands for, as a request that became void may have stored it.
   base::Result<void> eraseClients(const std::string& accountId, const std::optional<std::string>& clientId);
 
-  // Deletes every credential of the account, its own included. Called once the account is gone.
-  base::Result<void> eraseAccount(const std::string& accountId);
+  // Deletes every credential of the account, its own included. Called once the account is gone. What the
+  // store cannot delete now it deletes when it works again, with a line in the log.
+  void eraseAccount(const std::string& accountId);
 
   // At start, before anybody is served: deletes every client's credential for which no granted record
-  // stands, and what is stored for an account that is not there, with a log line for each.
+  // stands, and what is stored for an account that is not there, with a log line for each. After a failure it
+  // is tried again when the store has worked.
   base::Result<void> reconcile();
 
   // When a request that is void has come to its end: deletes what it stored before it became void, unless a
@@ -57,21 +66,40 @@ class Keychain : public RVDKeychainManager {
   void requestEnded(const std::shared_ptr<requests::RequestContext>& request);
 
  private:
-  // What the records say about a place.
+  using Request = std::shared_ptr<requests::RequestContext>;
+
+  // What the database says about a place.
   struct Standing {
-    bool isOfAnAccount = false;  // the account is there
+    bool isOfAnAccount = false;  // the account is there; for a client's place, set up as well
     bool isGranted = false;      // a client's, and a granted record stands for it
+    bool isDeleted = false;      // what may still be stored there counts as deleted
+    clients::Evidence evidence = clients::Evidence::kUnknown;  // of the client's record
   };
 
   base::Result<Standing> standing(const Place& place);
-  bool isGranted(const Place& place);
-  std::shared_ptr<const RVAccountCredential> read(const Place& place);
+  bool mayBeRead(const Place& place, bool onlyGranted);
+  std::shared_ptr<const RVAccountCredential> read(const Place& place, bool onlyGranted);
+  // What the store owes is done, now that a call of it has succeeded.
+  void storeHasWorked();
+  std::optional<RVError> changeFor(const Request& request,
+                                   const Place& place,
+                                   const std::function<base::Result<void>()>& change);
+
+  // With changes_ held.
+  base::Result<void> checkEvidence(const Place& place, const Request& request);
   base::Result<void> store(const Place& place, const RVAccountCredential& credential);
+  base::Result<void> remove(const Place& place);
+  base::Result<void> deleteWhatNobodyMayRead();
+
+  // The living request that wrote there last; null where there is none.
+  Request writerOf(const Place& place);
 
   records::Database& database_;
   CredentialStore& store_;
   RVLogService& log_;
-  std::mutex mutex_;                                                  // held while the store is changed
+  std::mutex changes_;  // held while the store is changed
+  std::atomic<bool> isReconcileOwed_ = false;
+  std::mutex mutex_;  // taken last, and not held while the store or the database works
   std::map<Place, std::weak_ptr<requests::RequestContext>> writers_;  // who wrote last; guarded by mutex_
 };
 

@@ -60,6 +60,22 @@ ALTER TABLE accounts ADD COLUMN state INTEGER NOT NULL DEFAULT 1 CHECK (state IN
 ALTER TABLE authorizations ADD COLUMN evidence INTEGER NOT NULL DEFAULT 0 CHECK (evidence IN (0, 1, 2, 3));
 ALTER TABLE access_log ADD COLUMN evidence INTEGER NOT NULL DEFAULT 0 CHECK (evidence IN (0, 1, 2, 3));
 )",
+    // To version 3. Until now all credentials were sealed.
+    R"(
+CREATE TABLE credential_store (
+  number INTEGER PRIMARY KEY CHECK (number = 1),
+  store INTEGER NOT NULL CHECK (store IN (0, 1, 2)),
+  leftovers INTEGER NOT NULL CHECK (leftovers IN (0, 1)),
+  name TEXT NOT NULL
+) STRICT;
+INSERT INTO credential_store (number, store, leftovers, name)
+  VALUES (1, EXISTS (SELECT 1 FROM credentials), 0, lower(hex(randomblob(16))));
+CREATE TABLE undeleted_credentials (
+  account TEXT NOT NULL,
+  client_id TEXT NOT NULL,
+  PRIMARY KEY (account, client_id)
+) STRICT, WITHOUT ROWID;
+)",
 };
 
 using Tables = std::vector<std::string>;

@@ -9,7 +9,7 @@
 namespace records {
 
 // What the database's user_version says once it has all tables.
-inline constexpr std::int64_t kSchemaVersion = 2;
+inline constexpr std::int64_t kSchemaVersion = 3;
 
 base::Result<std::int64_t> schemaVersion(Connection& connection);
 
