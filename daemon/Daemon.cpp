@@ -19,6 +19,8 @@
 #include "daemon/bus/Senders.h"
 #include "daemon/credentials/Keychain.h"
 #include "daemon/credentials/SealedStore.h"
+#include "daemon/credentials/SecretServiceStore.h"
+#include "daemon/credentials/StoreChoice.h"
 #include "daemon/http/FacebookRequests.h"
 #include "daemon/http/JSONReader.h"
 #include "daemon/http/TransferThread.h"
@@ -200,9 +202,6 @@ base::Result<std::unique_ptr<Daemon>> Daemon::start(const Places& places,
 }
 
 base::Result<void> Daemon::openStorage(const Places& places) {
-  if (settings_.credentialStore != config::CredentialStore::kSealed)
-    return base::Failure{base::FailureKind::kInvalid,
-                         "The only store for credentials that this rvd offers is \"sealed\""};
   storage_ = std::make_unique<Storage>();
   Storage& storage = *storage_;
   const auto keep = [](auto& place, auto result) -> base::Result<void> {
@@ -219,11 +218,6 @@ base::Result<void> Daemon::openStorage(const Places& places) {
     return kept;
   if (auto kept = keep(storage.records, AuthorizationRecords::load(database, log_, state::systemTime)); !kept)
     return kept;
-  if (auto kept = keep(storage.credentialStore,
-                       credentials::SealedStore::open(database, *storage.directory, places.sealingKey, log_));
-      !kept)
-    return kept;
-  storage.keychain = std::make_unique<credentials::Keychain>(database, *storage.credentialStore, log_);
   storage.accessLog = std::make_unique<records::AccessLog>(
       database, log_, state::systemTime, std::chrono::days(settings_.accessLogDays));
   if (auto pruned = storage.accessLog->prune(); !pruned) return pruned;
@@ -231,7 +225,43 @@ base::Result<void> Daemon::openStorage(const Places& places) {
   storage.preferences = std::make_unique<preferences::PreferencesStore>(*storage.directory, log_);
   if (auto done = storage.intents->completeInterrupted(*storage.records, *storage.accounts, log_); !done)
     return done;
-  return storage.keychain->reconcile();
+  return openCredentials(places);
+}
+
+// After what was interrupted has been brought to its end, so that nothing is moved that was taken away.
+base::Result<void> Daemon::openCredentials(const Places& places) {
+  using credentials::StoreKind;
+  Storage& storage = *storage_;
+  records::Database& database = *storage.database;
+  auto choice = credentials::StoreChoice::read(database);
+  if (!choice) return choice.failure();
+  const bool isSealed = settings_.credentialStore == config::CredentialStore::kSealed;
+  std::unique_ptr<credentials::CredentialStore> keyring =
+      std::make_unique<credentials::SecretServiceStore>(choice->name);
+  std::unique_ptr<credentials::CredentialStore> sealed;
+  if (isSealed || choice->store == StoreKind::kSealed || choice->hasLeftovers) {
+    auto opened = credentials::SealedStore::open(database, *storage.directory, places.sealingKey, log_);
+    if (!opened) return opened.failure();
+    sealed = *std::move(opened);
+  }
+  storage.credentialStore = std::move(isSealed ? sealed : keyring);
+  const auto& other = isSealed ? keyring : sealed;
+  if (auto kept = credentials::keepCredentialsIn(isSealed ? StoreKind::kSealed : StoreKind::kSecretService,
+                                                 *storage.credentialStore,
+                                                 other.get(),
+                                                 database,
+                                                 *std::move(choice),
+                                                 log_);
+      !kept)
+    return kept;
+  storage.keychain = std::make_unique<credentials::Keychain>(database, *storage.credentialStore, log_);
+  auto done = storage.keychain->reconcile();
+  if (done || isSealed) return done;
+  // Everything else works without the keyring, which may be there later.
+  logging::error(log_,
+                 "Until the desktop's keyring can be used, no credential is handed out or stored: %@",
+                 {RVValue(done.failure().message)});
+  return {};
 }
 
 void Daemon::serve(const Places& places) {

@@ -54,6 +54,7 @@ class Daemon {
 
   Daemon(const config::Settings& settings, RVLogService& log);
   base::Result<void> openStorage(const Places& places);
+  base::Result<void> openCredentials(const Places& places);
   void serve(const Places& places);
   bus::RehearsalParts rehearsalParts(const Places& places, const RVDHostServices& services);
   void connectionLeft(const std::string& uniqueName);

@@ -48,6 +48,7 @@ void ManagementService::addAccountWithToken(Call& call,
       logging::error(parts_.log,
                      "An account that could not be set up is left until the next start: %@",
                      {removed.failure().message});
+    parts_.keychain.eraseAccount(account->identifier);
     throwFailure(isSetUp.failure());
   }
   call.reply([&](sdbus::MethodReply& reply) { reply << account->identifier; });
@@ -78,6 +79,7 @@ void ManagementService::removeAccount(SharedCall call) {
             ? parts_.accounts.remove(accountID)
             : base::Failure{base::FailureKind::kFailed,
                             "Its clients' access could not be revoked, so the account stays; try again"};
+    if (removed) parts_.keychain.eraseAccount(accountID);
     finish(*begun);
     if (!removed) throwFailure(removed.failure());
     barrier.reset();  // whoever is answered may ask again at once

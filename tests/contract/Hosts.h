@@ -68,6 +68,10 @@ class FakeServices {
 
 class DaemonServices {
  public:
+  explicit DaemonServices(
+      const support::StoredState::MakeStore& makeStore = support::StoredState::sealedStore)
+      : state_(directory_.path("rvd"), makeStore) {}
+
   RVDAccountStore& store() { return *store_; }
   RVDKeychainManager& keychain() { return *state_.keychain; }
   RVDAccessLog& accessLog() { return state_.accessLog; }
@@ -96,7 +100,7 @@ class DaemonServices {
 
  private:
   support::TemporaryDirectory directory_;
-  support::StoredState state_{directory_.path("rvd")};
+  support::StoredState state_;
   std::shared_ptr<records::RequestStore> store_ = state_.storeFor(support::newRequest());
   preferences::PreferencesStore preferences_{*state_.directory, state_.log};
   preferences::SerialQueues queues_{state_.log};

@@ -1,6 +1,8 @@
 #include <gtest/gtest.h>
 
+#include "daemon/credentials/SecretServiceStore.h"
 #include "tests/contract/Suites.h"
+#include "tests/support/DesktopKeyring.h"
 
 namespace contract {
 namespace {
@@ -42,7 +44,23 @@ class Keychain : public ::testing::Test {
   std::string accountId_;
 };
 
-TYPED_TEST_SUITE(Keychain, Implementations, Names);
+// The daemon's services with the credentials in the desktop's keyring.
+class KeyringServices : private support::DesktopKeyring, public DaemonServices {
+ public:
+  KeyringServices()
+      : DaemonServices(
+            [](auto&) { return std::make_unique<credentials::SecretServiceStore>("a database"); }) {}
+};
+
+struct KeychainNames {
+  template <typename Services>
+  static std::string GetName(int number) {
+    return std::is_same_v<Services, KeyringServices> ? "SecretService" : Names::GetName<Services>(number);
+  }
+};
+
+using Keychains = ::testing::Types<FakeServices, DaemonServices, KeyringServices>;
+TYPED_TEST_SUITE(Keychain, Keychains, KeychainNames);
 
 TYPED_TEST(Keychain, HoldsNothingAtFirst) {
   EXPECT_EQ(this->get("app"), nullptr);

@@ -4,6 +4,7 @@
 #include <chrono>
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <iterator>
 #include <memory>
 #include <optional>
@@ -45,7 +46,10 @@ inline std::string contentOf(const std::filesystem::path& path) {
 // The services as main() wires them. Throws where one cannot be opened.
 class StoredState {
  public:
-  explicit StoredState(const std::filesystem::path& path)
+  // makeStore: makes the store of credentials.
+  using MakeStore = std::function<std::unique_ptr<credentials::CredentialStore>(StoredState&)>;
+
+  explicit StoredState(const std::filesystem::path& path, const MakeStore& makeStore = sealedStore)
       : directory(valueOf(state::Directory::open(path))),
         database(valueOf(records::Database::open(*directory, log))),
         accounts(valueOf(records::Accounts::load(*database, state::randomIdentifier))),
@@ -56,8 +60,13 @@ class StoredState {
             [this] { return now; },
             kKeepAccessLog),
         intents(*database),
-        credentialStore(valueOf(credentials::SealedStore::open(*database, *directory, std::nullopt, log))),
+        credentialStore(makeStore(*this)),
         keychain(std::make_unique<credentials::Keychain>(*database, *credentialStore, log)) {}
+
+  static std::unique_ptr<credentials::CredentialStore> sealedStore(StoredState& state) {
+    return valueOf(
+        credentials::SealedStore::open(*state.database, *state.directory, std::nullopt, state.log));
+  }
 
   std::shared_ptr<records::RequestStore> storeFor(std::shared_ptr<requests::RequestContext> request) {
     return std::make_shared<records::RequestStore>(*records, *accounts, std::move(request), client, log);
