@@ -58,43 +58,29 @@ Result<void> copy(const Place& place, CredentialStore& from, CredentialStore& to
   return {};
 }
 
-// One move, as the database's notes go with it.
-class Move {
- public:
-  Move(CredentialStore& from, CredentialStore& to, records::Database& database, StoreChoice& choice)
-      : from_(from),
-        to_(to),
-        database_(database),
-        choice_(choice) {}
-
-  // Everything is in both stores then.
-  Result<void> copyAll() {
-    const auto places = from_.places();
-    if (!places) return places.failure();
-    if (!places->empty() || choice_.hasLeftovers) {
-      choice_.hasLeftovers = true;
-      if (auto noted = note(database_, choice_); !noted) return noted;
-      if (auto removed = removeAll(to_); !removed) return removed;
+// Everything is in both stores then, and `choice` says that there are leftovers.
+Result<void> copyAll(CredentialStore& from,
+                     CredentialStore& to,
+                     records::Database& database,
+                     StoreChoice& choice) {
+  const auto places = from.places();
+  if (!places) return places.failure();
+  if (places->empty() && !choice.hasLeftovers) return {};
+  choice.hasLeftovers = true;
+  if (auto noted = note(database, choice); !noted) return noted;
+  if (auto removed = removeAll(to); !removed) return removed;
+  for (const Place& place : *places) {
+    auto copied = copy(place, from, to);
+    if (copied) continue;
+    // The copies go at once where they can, else with the next start.
+    if (removeAll(to)) {
+      choice.hasLeftovers = false;
+      (void)note(database, choice);
     }
-    for (const Place& place : *places)
-      if (auto copied = copy(place, from_, to_); !copied) return takeBack(std::move(copied));
-    return {};
+    return copied;
   }
-
- private:
-  // The copies go at once where they can; else with the next start.
-  Result<void> takeBack(Result<void> failed) {
-    if (!removeAll(to_)) return failed;
-    choice_.hasLeftovers = false;
-    (void)note(database_, choice_);
-    return failed;
-  }
-
-  CredentialStore& from_;
-  CredentialStore& to_;
-  records::Database& database_;
-  StoreChoice& choice_;
-};
+  return {};
+}
 
 Result<void> move(StoreKind wanted,
                   CredentialStore& store,
@@ -104,7 +90,7 @@ Result<void> move(StoreKind wanted,
                   RVLogService& log) {
   // What nobody may read is not moved.
   if (auto done = Keychain(database, other, log).reconcile(); !done) return done;
-  if (auto copied = Move(other, store, database, choice).copyAll(); !copied) return copied;
+  if (auto copied = copyAll(other, store, database, choice); !copied) return copied;
   StoreChoice moved = choice;
   moved.store = wanted;
   if (auto noted = note(database, moved); !noted) return noted;
