@@ -22,7 +22,9 @@
 #include "daemon/credentials/SecretServiceStore.h"
 #include "daemon/credentials/StoreChoice.h"
 #include "daemon/http/FacebookRequests.h"
+#include "daemon/http/FacebookServer.h"
 #include "daemon/http/JSONReader.h"
+#include "daemon/http/Revocations.h"
 #include "daemon/http/TransferThread.h"
 #include "daemon/log/Log.h"
 #include "daemon/preferences/NotificationCenter.h"
@@ -30,6 +32,7 @@
 #include "daemon/preferences/SerialQueues.h"
 #include "daemon/records/Account.h"
 #include "daemon/records/Intents.h"
+#include "daemon/records/Outbox.h"
 #include "daemon/requests/WaitingLimits.h"
 #include "daemon/state/Clock.h"
 #include "daemon/state/Directory.h"
@@ -74,6 +77,16 @@ std::string acceptLanguage(const std::vector<std::string>& languages) {
   return header;
 }
 
+// The own token of an account, also of one that is not found any more; absent where it is not to be had
+// again.
+base::Result<std::optional<RVSecret>> ownToken(const std::string& account,
+                                               credentials::CredentialStore& store) {
+  const auto credential = store.read({account, std::nullopt});
+  if (!credential && credential.failure().kind != base::FailureKind::kDamaged) return credential.failure();
+  if (!credential || !*credential) return std::optional<RVSecret>();
+  return std::optional<RVSecret>((*credential)->oauthToken());
+}
+
 // The token of the account that plug-ins work with: the first one of the type.
 std::optional<RVSecret> masterToken(records::Accounts& accounts, RVDKeychainManager& keychain) {
   const auto list = accounts.listOfType(RVAccountTypeIdentifierFacebook);
@@ -94,6 +107,8 @@ struct Daemon::Storage {
   std::unique_ptr<records::AuthorizationRecords> records;
   std::unique_ptr<records::AccessLog> accessLog;
   std::unique_ptr<records::Intents> intents;
+  std::unique_ptr<records::Outbox> outbox;
+  std::vector<records::OwedRevocation> owedRevocations;  // at the start
   std::unique_ptr<credentials::CredentialStore> credentialStore;
   std::unique_ptr<credentials::Keychain> keychain;
   std::unique_ptr<preferences::PreferencesStore> preferences;
@@ -136,12 +151,12 @@ struct Daemon::Work {
   Work(const Places& places, const config::Settings& settings, Storage& storage, Bus& bus, RVLogService& log)
       : queues(log),
         transfers(log),
-        facebookRequests(
-            transfers,
-            serverOf(settings),
-            [&storage] { return masterToken(*storage.accounts, *storage.keychain); },
-            acceptLanguage(places.languages),
-            log),
+        server(transfers, serverOf(settings), acceptLanguage(places.languages)),
+        revocations(storage.owedRevocations,
+                    {*storage.outbox, *storage.accounts, *storage.records},
+                    meansOfRevocations(storage),
+                    log),
+        facebookRequests(server, revocations),
         alerts(bus.agents, state::randomIdentifier, alerts::AlertService::growingPause),
         rate(settings.callsPerSecond, std::chrono::steady_clock::now),
         pool(kRunningThreads,
@@ -156,10 +171,24 @@ struct Daemon::Work {
                  alerts.requestEnded(request);
                }}) {}
 
+  http::Revocations::Means meansOfRevocations(Storage& storage) {
+    return {
+        [&storage](const std::string& account) { return ownToken(account, *storage.credentialStore); },
+        [&storage](const std::string& account) { return storage.keychain->eraseAccount(account); },
+        [this](const std::string& appID, std::optional<RVSecret> token, TKFacebookRequestHandler handler) {
+          server.beginRevocation(appID, std::move(token), std::move(handler));
+        },
+        [this](auto pause, auto work) { transfers.after(pause, std::move(work)); },
+        [this](auto work) { return pool.submit(std::move(work)); },
+        http::Revocations::growingPause};
+  }
+
   preferences::NotificationCenter notifications;
   preferences::SerialQueues queues;
   http::JSONReader jsonReader;
   http::TransferThread transfers;
+  http::FacebookServer server;
+  http::Revocations revocations;
   http::FacebookRequests facebookRequests;
   alerts::AlertService alerts;
   requests::RateLimit rate;
@@ -223,8 +252,13 @@ base::Result<void> Daemon::openStorage(const Places& places) {
   if (auto pruned = storage.accessLog->prune(); !pruned) return pruned;
   storage.intents = std::make_unique<records::Intents>(database);
   storage.preferences = std::make_unique<preferences::PreferencesStore>(*storage.directory, log_);
-  if (auto done = storage.intents->completeInterrupted(*storage.records, *storage.accounts, log_); !done)
+  storage.outbox = std::make_unique<records::Outbox>(database, state::systemTime);
+  if (auto done =
+          storage.intents->completeInterrupted(*storage.records, *storage.accounts, *storage.outbox, log_);
+      !done)
     return done;
+  if (auto done = storage.outbox->eraseSettledAccounts(*storage.accounts, log_); !done) return done;
+  if (auto kept = keep(storage.owedRevocations, storage.outbox->list()); !kept) return kept;
   return openCredentials(places);
 }
 
@@ -289,6 +323,7 @@ void Daemon::serve(const Places& places) {
                          *storage.records,
                          *storage.accessLog,
                          *storage.intents,
+                         work.revocations,
                          *storage.keychain,
                          *storage.preferences,
                          work.notifications,
@@ -327,6 +362,7 @@ void Daemon::serve(const Places& places) {
     throw std::runtime_error(std::string("the name ") + bus::kServiceName +
                              " was not to be had: " + error.getMessage());
   }
+  work.revocations.start();
 }
 
 bus::RehearsalParts Daemon::rehearsalParts(const Places& places, const RVDHostServices& services) {
@@ -338,9 +374,17 @@ bus::RehearsalParts Daemon::rehearsalParts(const Places& places, const RVDHostSe
             return requests.problemWithSending(permissions);
           },
           [this, accountToken](const std::vector<std::string>& languages) -> rehearsal::Server {
-            return {std::make_shared<http::FacebookRequests>(
-                        work_->transfers, serverOf(settings_), accountToken, acceptLanguage(languages), log_),
-                    accountToken};
+            // The requests keep what they are made of.
+            struct InLanguages {
+              http::FacebookServer server;
+              http::FacebookRequests requests;
+              InLanguages(Work& work, http::FacebookServerSettings settings, const std::string& header)
+                  : server(work.transfers, std::move(settings), header),
+                    requests(server, work.revocations) {}
+            };
+            const auto own =
+                std::make_shared<InLanguages>(*work_, serverOf(settings_), acceptLanguage(languages));
+            return {std::shared_ptr<http::FacebookRequests>(own, &own->requests), accountToken};
           },
           [&entitlements = bus_->entitlements, directories = places.applicationDirectories](
               const std::string& id, const std::vector<std::string>& languages) {
@@ -366,7 +410,7 @@ bool Daemon::run() {
 
 void Daemon::stop() {
   // Requests that come now are void from the start. What waits for the user or the server stops waiting, so
-  // the pool's threads can end; revocations are given a moment to reach the server.
+  // the pool's threads can end; revocations that are on their way are given a moment to be answered.
   const auto barrier = work_->table.makeVoid(requests::VoidReason::kStopping,
                                              [](const requests::RequestKey&) { return true; });
   work_->pool.stop();

@@ -68,18 +68,24 @@ void ManagementService::removeAccount(SharedCall call) {
         requests::VoidReason::kAccountRemoved,
         [accountType](const requests::RequestKey& key) { return key.accountType == accountType; }));
     const auto clientIDs = clientsWithRecord(accountType);
-    pluginForAccountType(parts_, accountType)
-        .revokeAllAccessToAccountsOfType(std::make_shared<const RVAccountType>(accountType),
-                                         makeStore(parts_),
-                                         [](bool, const std::optional<RVError>&) {});
+    auto& plugin = pluginForAccountType(parts_, accountType);
+    try {
+      plugin.revokeAllAccessToAccountsOfType(std::make_shared<const RVAccountType>(accountType),
+                                             makeStore(parts_),
+                                             [](bool, const std::optional<RVError>&) {});
+    } catch (...) {
+      finish(*begun);
+      throw;
+    }
     // A record that outlived the account would be a grant for the next one.
     const bool isRevoked = parts_.records.list(accountType).empty();
-    const auto removed =
+    auto removed =
         isRevoked
-            ? parts_.accounts.remove(accountID)
+            ? parts_.accounts.retire(accountID)
             : base::Failure{base::FailureKind::kFailed,
                             "Its clients' access could not be revoked, so the account stays; try again"};
-    if (removed) parts_.keychain.eraseAccount(accountID);
+    // Gone for everybody but the server, which may be owed revocations that its token signs.
+    if (removed) parts_.revocations.accountWasRetired(accountID);
     finish(*begun);
     if (!removed) throwFailure(removed.failure());
     barrier.reset();  // whoever is answered may ask again at once

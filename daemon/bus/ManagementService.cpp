@@ -4,6 +4,7 @@
 
 #include <map>
 #include <optional>
+#include <set>
 #include <utility>
 
 #include "daemon/bus/Answers.h"
@@ -20,6 +21,29 @@ std::string readClientID(Call& call) {
   call.message() >> id;
   checkClientID(id);
   return id;
+}
+
+// One a{sv}: the values, and one member more, a list of names; null: it is left out.
+void writeEntry(sdbus::MethodReply& reply,
+                const RVDictionary& values,
+                const char* listKey,
+                const std::set<std::string, std::less<>>* list) {
+  reply.openContainer("{sv}");
+  for (const auto& [key, value] : values) {
+    reply.openDictEntry("sv");
+    reply << key;
+    writeVariant(reply, value);
+    reply.closeDictEntry();
+  }
+  if (list != nullptr) {
+    reply.openDictEntry("sv");
+    reply << listKey;
+    reply.openVariant("as");
+    writeNames(reply, *list);
+    reply.closeVariant();
+    reply.closeDictEntry();
+  }
+  reply.closeContainer();
 }
 
 }  // namespace
@@ -58,6 +82,7 @@ ManagementService::ManagementService(sdbus::IObject& object,
                     {"AuthorizeAccess", handler(&Self::authorizeAccess)},
                     {"RevokeAccess", handler(&Self::revokeAccess)},
                     {"RevokeAllAccess", handler(&Self::revokeAllAccess)},
+                    {"ListPendingRevocations", handler(&Self::listPendingRevocations)},
                     {"ForgetRefusal", handler(&Self::forgetRefusal)},
                     {"ListAccessLog", handler(&Self::listAccessLog)},
                     {"ExplainAccess", handler(&Self::explainAccess)},
@@ -69,7 +94,9 @@ ManagementService::ManagementService(sdbus::IObject& object,
   object.registerSignal("AuthorizationsChanged")
       .onInterface(interfaces::kManagement1)
       .withParameters<std::string>("account_type");
-  parts_.records.onChange([this](const std::string& accountType) { announceAuthorizations(accountType); });
+  const auto announce = [this](const std::string& accountType) { announceAuthorizations(accountType); };
+  parts_.records.onChange(announce);
+  parts_.revocations.onChange(announce);
 }
 
 void ManagementService::listAuthorizations(SharedCall call) {
@@ -80,28 +107,13 @@ void ManagementService::listAuthorizations(SharedCall call) {
     call->reply([&](sdbus::MethodReply& reply) {
       reply.openContainer("a{sv}");
       for (const auto& record : parts_.records.list(accountType)) {
-        RVDictionary entry{{"client_id", record.clientId},
-                           {"name", parts_.clients.clientForID(record.clientId)->name()},
-                           {"granted", record.granted},
-                           {"options", record.options.value_or(RVDictionary())},
-                           {"evidence", clients::evidenceText(record.evidence)},
-                           {"changed", std::int64_t{record.changed.time_since_epoch().count()}}};
-        reply.openContainer("{sv}");
-        for (const auto& [key, value] : entry) {
-          reply.openDictEntry("sv");
-          reply << key;
-          writeVariant(reply, value);
-          reply.closeDictEntry();
-        }
-        if (record.permissions) {
-          reply.openDictEntry("sv");
-          reply << "permissions";
-          reply.openVariant("as");
-          writeNames(reply, *record.permissions);
-          reply.closeVariant();
-          reply.closeDictEntry();
-        }
-        reply.closeContainer();
+        const RVDictionary entry{{"client_id", record.clientId},
+                                 {"name", parts_.clients.clientForID(record.clientId)->name()},
+                                 {"granted", record.granted},
+                                 {"options", record.options.value_or(RVDictionary())},
+                                 {"evidence", clients::evidenceText(record.evidence)},
+                                 {"changed", std::int64_t{record.changed.time_since_epoch().count()}}};
+        writeEntry(reply, entry, "permissions", record.permissions ? &*record.permissions : nullptr);
       }
       reply.closeContainer();
     });
@@ -225,6 +237,25 @@ base::Result<void> ManagementService::eraseCredentials(const records::Intent& in
 void ManagementService::finish(std::int64_t intent) {
   if (const auto finished = parts_.intents.finish(intent); !finished)
     logging::error(parts_.log, "What was begun stays noted as begun: %@", {finished.failure().message});
+}
+
+void ManagementService::listPendingRevocations(SharedCall call) {
+  std::string accountType;
+  call->message() >> accountType;
+  pluginForAccountType(parts_, accountType);
+  dispatcher_.onPool(call, [this, call, accountType] {
+    call->reply([&](sdbus::MethodReply& reply) {
+      reply.openContainer("a{sv}");
+      for (const auto& owed : parts_.revocations.list(accountType)) {
+        RVDictionary entry{{"app_id", owed.appId},
+                           {"since", std::int64_t{owed.since.time_since_epoch().count()}},
+                           {"attempts", owed.attempts}};
+        if (owed.failure) entry.emplace("failure", *owed.failure);
+        writeEntry(reply, entry, "client_ids", &owed.clientIds);
+      }
+      reply.closeContainer();
+    });
+  });
 }
 
 void ManagementService::forgetRefusal(SharedCall call) {

@@ -49,6 +49,7 @@ class ManagementService {
               std::optional<requests::RequestTable::Barrier> barrier);
   base::Result<void> eraseCredentials(const records::Intent& intent);
   void finish(std::int64_t intent);
+  void listPendingRevocations(SharedCall call);
   void forgetRefusal(SharedCall call);
   void listAccessLog(SharedCall call);
   std::vector<std::string> clientsWithRecord(const std::string& accountType) const;

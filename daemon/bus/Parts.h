@@ -11,6 +11,7 @@
 #include "daemon/clients/Identities.h"
 #include "daemon/config/Settings.h"
 #include "daemon/credentials/Keychain.h"
+#include "daemon/http/Revocations.h"
 #include "daemon/plugins/PluginModule.h"
 #include "daemon/preferences/NotificationCenter.h"
 #include "daemon/preferences/PreferencesStore.h"
@@ -48,6 +49,7 @@ struct Parts {
   records::AuthorizationRecords& records;
   records::AccessLog& accessLog;
   records::Intents& intents;
+  http::Revocations& revocations;
   credentials::Keychain& keychain;
   preferences::PreferencesStore& preferences;
   preferences::NotificationCenter& notifications;

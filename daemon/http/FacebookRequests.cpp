@@ -1,18 +1,20 @@
 #include "daemon/http/FacebookRequests.h"
 
+#include <functional>
 #include <mutex>
+#include <stdexcept>
 #include <utility>
 #include <vector>
 
-#include "daemon/http/ServerURL.h"
 #include "daemon/http/TransferErrors.h"
 #include "daemon/requests/RequestContext.h"
+#include "host/Constants.h"
 
 namespace http {
 namespace {
 
 using requests::RequestContext;
-using Form = std::vector<std::pair<std::string, std::string>>;
+using Form = FacebookServer::Form;
 
 void addIfPresent(Form& form, const std::string& name, const std::optional<std::string>& value) {
   if (value) form.emplace_back(name, *value);
@@ -50,22 +52,22 @@ class Exchange {
     return waiting_ != nullptr;
   }
 
-  // Ends the transfer when the request becomes void, as long as the answer has not come.
-  void endWhenVoid(TransferThread& transfers, TransferThread::ID transfer) {
+  // Has this run when the request becomes void, as long as the answer has not come.
+  void onVoid(std::function<void()> callback) {
     if (context_ == nullptr) return;
-    auto registration = context_->onVoid([&transfers, transfer] { transfers.cancel(transfer); });
+    auto registration = context_->onVoid(std::move(callback));
     const std::lock_guard lock(mutex_);
-    if (!hasEnded_) registration_ = std::move(registration);
+    if (!hasEnded_) registrations_.push_back(std::move(registration));
   }
 
   void handle(const std::optional<std::string>& body,
               const std::optional<TKHTTPResponse>& response,
               const std::optional<RVError>& error) {
-    RequestContext::Registration registration;  // dropped without the lock: that may wait
+    std::vector<RequestContext::Registration> registrations;  // dropped without the lock: that may wait
     {
       const std::lock_guard lock(mutex_);
       hasEnded_ = true;
-      std::swap(registration, registration_);
+      std::swap(registrations, registrations_);
     }
     const RequestContext::Scope scope(context_);
     const TKFacebookRequestHandler handler = std::exchange(handler_, nullptr);
@@ -81,88 +83,75 @@ class Exchange {
   TKFacebookRequestHandler handler_;
   std::mutex mutex_;
   bool hasEnded_ = false;
-  RequestContext::Registration registration_;
+  std::vector<RequestContext::Registration> registrations_;
 };
 
 }  // namespace
 
 // What all requests and sessions of one factory share.
-class FacebookRequests::Server {
+class FacebookRequests::Shared : public std::enable_shared_from_this<Shared> {
  public:
-  Server(TransferThread& transfers,
-         FacebookServerSettings settings,
-         std::function<std::optional<RVSecret>()> masterToken,
-         std::string acceptLanguage,
-         RVLogService& log)
-      : transfers_(transfers),
-        settings_(std::move(settings)),
-        masterToken_(std::move(masterToken)),
-        acceptLanguage_(std::move(acceptLanguage)),
-        log_(log) {}
+  Shared(FacebookServer& server, Revocations& revocations)
+      : server_(server),
+        revocations_(revocations) {}
 
   // Why a request for the permissions is not to be sent at all.
   std::optional<RVError> problemWith(const std::optional<RVPermissionSet>& permissions) const {
     if (permissions && !isListable(*permissions))
       return transferError(TransferErrorCode::kNotSendable, "a permission's name holds a comma");
-    if (!settings_.url) return transferError(TransferErrorCode::kNoServer);
-    return std::nullopt;
+    return server_.problem();
   }
 
-  // For the request that is current on this thread. problem: why it is not to be sent at all.
+  // For the request that is current on this thread. problem: why it is not to be sent at all. appID: of the
+  // app that is authorized; absent where none is.
   void send(const std::string& exchangeName,
             Form form,
             std::optional<RVSecret> token,
             const std::optional<RVError>& problem,
-            TKFacebookRequestHandler handler) const {
+            const std::optional<std::string>& appID,
+            TKFacebookRequestHandler handler) {
     const auto exchange = std::make_shared<Exchange>(RequestContext::current(), std::move(handler));
-    const auto handle = [exchange](const auto&... answer) { exchange->handle(answer...); };
-    if (!exchange->beginWaiting())
-      return transfers_.fail(transferError(TransferErrorCode::kCancelled), handle);
-    if (problem) return transfers_.fail(*problem, handle);
-    const auto transfer =
-        transfers_.start(transferFor(exchangeName, std::move(form), std::move(token)), handle);
-    exchange->endWhenVoid(transfers_, transfer);
+    if (!exchange->beginWaiting()) return fail(exchange, transferError(TransferErrorCode::kCancelled));
+    if (problem) return fail(exchange, *problem);
+    const auto begin = [self = shared_from_this(), exchange, exchangeName](Form whole,
+                                                                           std::optional<RVSecret> signing) {
+      const auto transfer = self->server_.begin(
+          exchangeName, std::move(whole), std::move(signing), [exchange](const auto&... answer) {
+            exchange->handle(answer...);
+          });
+      if (!transfer) return;
+      exchange->onVoid([&transfers = self->server_.transfers(), transfer] { transfers.cancel(*transfer); });
+    };
+    if (!appID) return begin(std::move(form), std::move(token));
+    const auto waiter = revocations_.beforeAuthorizing(
+        *appID,
+        [self = shared_from_this(), exchange, begin, form = std::move(form), token = std::move(token)](
+            const std::optional<RVError>& error) {
+          if (error) return self->fail(exchange, *error);
+          begin(form, token);
+        });
+    if (waiter == 0) return;
+    exchange->onVoid([&revocations = revocations_, waiter] {
+      if (const auto continuation = revocations.giveUp(waiter))
+        continuation(transferError(TransferErrorCode::kCancelled));
+    });
   }
 
-  void revoke(const std::string& appID) const {
-    const auto report = [&log = log_, appID](const auto&, const auto&, const std::optional<RVError>& error) {
-      // The answer is of no interest, so one without a body will do.
-      if (!error || error->code == static_cast<std::int64_t>(TransferErrorCode::kNoBody)) return;
-      std::optional<RVValue> text;
-      if (const auto description = error->localizedDescription()) text = *description;
-      log.RVLog(kRVLogLevelError,
-                kRVLogFacilityDaemon,
-                "daemon/http/FacebookRequests",
-                "FacebookRequests::revoke",
-                __LINE__,
-                "The server was not told to forget the token of app %@: %@",
-                {RVValue(appID), text});
-    };
-    if (!settings_.url) return transfers_.fail(transferError(TransferErrorCode::kNoServer), report);
-    Transfer transfer = transferFor("revoke", {{"app_id", appID}}, masterToken_());
-    transfer.mayEndLate = true;
-    transfers_.start(std::move(transfer), report);
+  void revoke(const std::string& appID) {
+    const auto owed = revocations_.owe(std::string(RVAccountTypeIdentifierFacebook), appID);
+    if (owed) return;
+    throw std::runtime_error("the server cannot be told to forget a token: " + owed.failure().message);
   }
 
  private:
-  Transfer transferFor(const std::string& exchangeName, Form form, std::optional<RVSecret> token) const {
-    // A URL that cannot be used is passed on as it is: the transfer fails and says why.
-    const std::optional<ServerURL> server = readServerURL(*settings_.url);
-    Transfer transfer;
-    transfer.url = server ? server->text + "/" + exchangeName : *settings_.url;
-    transfer.form = std::move(form);
-    transfer.bearerToken = std::move(token);
-    transfer.acceptLanguage = acceptLanguage_;
-    transfer.timeout = settings_.timeout;
-    transfer.caFile = settings_.caFile;
-    return transfer;
+  // Never on the caller's stack.
+  void fail(const std::shared_ptr<Exchange>& exchange, RVError error) {
+    server_.transfers().fail(std::move(error),
+                             [exchange](const auto&... answer) { exchange->handle(answer...); });
   }
 
-  TransferThread& transfers_;
-  const FacebookServerSettings settings_;
-  const std::function<std::optional<RVSecret>()> masterToken_;
-  const std::string acceptLanguage_;
-  RVLogService& log_;
+  FacebookServer& server_;
+  Revocations& revocations_;
 };
 
 namespace {
@@ -171,56 +160,52 @@ namespace {
 template <typename Interface>
 class Request final : public Interface {
  public:
-  Request(std::shared_ptr<const FacebookRequests::Server> server,
+  Request(std::shared_ptr<FacebookRequests::Shared> shared,
           std::string exchangeName,
           Form form,
-          std::optional<RVError> problem)
-      : server_(std::move(server)),
+          std::optional<RVError> problem,
+          std::optional<std::string> appID = std::nullopt)
+      : shared_(std::move(shared)),
         exchangeName_(std::move(exchangeName)),
         form_(std::move(form)),
-        problem_(std::move(problem)) {}
+        problem_(std::move(problem)),
+        appID_(std::move(appID)) {}
 
   void setAccessToken(std::optional<RVSecret> accessToken) override { accessToken_ = std::move(accessToken); }
 
   void performRequestWithHandler(TKFacebookRequestHandler handler) override {
-    server_->send(exchangeName_,
+    shared_->send(exchangeName_,
                   std::move(form_),
                   std::exchange(accessToken_, std::nullopt),
                   problem_,
+                  appID_,
                   std::move(handler));
   }
 
  private:
-  const std::shared_ptr<const FacebookRequests::Server> server_;
+  const std::shared_ptr<FacebookRequests::Shared> shared_;
   const std::string exchangeName_;
   Form form_;
   const std::optional<RVError> problem_;
+  const std::optional<std::string> appID_;
   std::optional<RVSecret> accessToken_;
 };
 
 class Session final : public TKFacebookSession {
  public:
-  explicit Session(std::shared_ptr<const FacebookRequests::Server> server)
-      : server_(std::move(server)) {}
+  explicit Session(std::shared_ptr<FacebookRequests::Shared> shared)
+      : shared_(std::move(shared)) {}
 
-  void revokeAccessTokenForAppWithID(const std::string& appID) override { server_->revoke(appID); }
+  void revokeAccessTokenForAppWithID(const std::string& appID) override { shared_->revoke(appID); }
 
  private:
-  const std::shared_ptr<const FacebookRequests::Server> server_;
+  const std::shared_ptr<FacebookRequests::Shared> shared_;
 };
 
 }  // namespace
 
-FacebookRequests::FacebookRequests(TransferThread& transfers,
-                                   FacebookServerSettings settings,
-                                   std::function<std::optional<RVSecret>()> masterToken,
-                                   std::string acceptLanguage,
-                                   RVLogService& log)
-    : server_(std::make_shared<const Server>(transfers,
-                                             std::move(settings),
-                                             std::move(masterToken),
-                                             std::move(acceptLanguage),
-                                             log)) {
+FacebookRequests::FacebookRequests(FacebookServer& server, Revocations& revocations)
+    : shared_(std::make_shared<Shared>(server, revocations)) {
 }
 
 FacebookRequests::~FacebookRequests() = default;
@@ -234,7 +219,7 @@ std::shared_ptr<TKFacebookAuthorizationRequest> FacebookRequests::initWithAppId(
   if (permissions) form.emplace_back("permissions", joined(*permissions));
   addIfPresent(form, "audience", audience);
   return std::make_shared<Request<TKFacebookAuthorizationRequest>>(
-      server_, "authorize", std::move(form), server_->problemWith(permissions));
+      shared_, "authorize", std::move(form), shared_->problemWith(permissions), appId);
 }
 
 std::shared_ptr<TKFacebookPermissionDescriptionRequest> FacebookRequests::initWithPermissions(
@@ -243,16 +228,16 @@ std::shared_ptr<TKFacebookPermissionDescriptionRequest> FacebookRequests::initWi
   Form form{{"permissions", joined(permissions)}};
   addIfPresent(form, "audience", audience);
   return std::make_shared<Request<TKFacebookPermissionDescriptionRequest>>(
-      server_, "describe", std::move(form), server_->problemWith(permissions));
+      shared_, "describe", std::move(form), shared_->problemWith(permissions));
 }
 
 std::optional<RVError> FacebookRequests::problemWithSending(
     const std::optional<RVPermissionSet>& permissions) const {
-  return server_->problemWith(permissions);
+  return shared_->problemWith(permissions);
 }
 
 std::shared_ptr<TKFacebookSession> FacebookRequests::initSession() {
-  return std::make_shared<Session>(server_);
+  return std::make_shared<Session>(shared_);
 }
 
 }  // namespace http

@@ -2,25 +2,18 @@
 #pragma once
 
 #include <chrono>
-#include <functional>
 #include <memory>
 #include <optional>
 #include <string>
 
-#include "daemon/http/TransferThread.h"
-#include "host/RVDKeychainManager.h"
-#include "host/RVLog.h"
+#include "daemon/http/FacebookServer.h"
+#include "daemon/http/Revocations.h"
 #include "host/TKFacebookRequests.h"
 
 namespace http {
 
-struct FacebookServerSettings {
-  std::optional<std::string> url;    // absent: every exchange fails and says so
-  std::chrono::seconds timeout{60};  // for one exchange
-  std::string caFile;                // PEM file of the authorities to trust; empty: the system's
-};
-
-// How long revocations may still take when the daemon stops (see TransferThread::stop).
+// How long revocations that are on their way may still take when the daemon stops (see
+// TransferThread::stop); the next start tells the server what it has not answered by then.
 inline constexpr std::chrono::seconds kRevocationGrace{3};
 
 // Makes requests to one server.
@@ -28,18 +21,16 @@ inline constexpr std::chrono::seconds kRevocationGrace{3};
 // A request belongs to the RequestContext that is current when it is performed: the context waits until
 // the answer has come, the exchange is ended when the context becomes void, and the handler runs with
 // the context as the current one. A void context's request is answered with an error and sends nothing.
-// A revocation belongs to no context, since nobody waits for it: it is sent whatever becomes of the
-// request that asked for it, and its failure is logged.
+// An app for which a revocation is still owed is authorized once the server has answered that; where it
+// cannot be told, the exchange fails with that error and is not sent.
+//
+// A revocation belongs to no context, since nobody waits for it: it is owed, whatever becomes of the
+// request that asked for it. One that cannot be written down throws std::runtime_error, so that whoever
+// revokes leaves the record as it is.
 class FacebookRequests final : public TKFacebookRequestFactory {
  public:
-  // transfers, log: outlive this object, its requests and its sessions. masterToken: gives the token of
-  // the account that the current call is about, absent where there is none; called on the thread that
-  // revokes. acceptLanguage: the user's languages, as the header of that name lists them; may be empty.
-  FacebookRequests(TransferThread& transfers,
-                   FacebookServerSettings settings,
-                   std::function<std::optional<RVSecret>()> masterToken,
-                   std::string acceptLanguage,
-                   RVLogService& log);
+  // Both outlive this object, its requests and its sessions.
+  FacebookRequests(FacebookServer& server, Revocations& revocations);
   ~FacebookRequests() override;
 
   std::shared_ptr<TKFacebookAuthorizationRequest> initWithAppId(
@@ -58,10 +49,10 @@ class FacebookRequests final : public TKFacebookRequestFactory {
   // absent where it is sent.
   std::optional<RVError> problemWithSending(const std::optional<RVPermissionSet>& permissions) const;
 
-  class Server;
+  class Shared;
 
  private:
-  const std::shared_ptr<const Server> server_;
+  const std::shared_ptr<Shared> shared_;
 };
 
 }  // namespace http

@@ -10,6 +10,7 @@
 #include "daemon/http/CurlLibrary.h"
 #include "daemon/http/OpenTransfer.h"
 #include "daemon/http/TransferErrors.h"
+#include "daemon/log/Log.h"
 
 namespace http {
 namespace {
@@ -62,6 +63,14 @@ void TransferThread::cancel(ID transfer) {
   curl_multi_wakeup(multi_);
 }
 
+void TransferThread::after(milliseconds time, std::function<void()> work) {
+  Timer timer{steady_clock::now() + time, std::move(work)};
+  const std::lock_guard lock(mutex_);
+  if (hasStopped_) return;
+  orders_.timers.push_back(std::move(timer));
+  curl_multi_wakeup(multi_);
+}
+
 void TransferThread::stop(milliseconds grace) {
   const std::lock_guard stopping(stopMutex_);
   if (!thread_.joinable()) return;
@@ -78,6 +87,7 @@ void TransferThread::run() {
     int running = 0;
     curl_multi_perform(multi_, &running);
     deliverFinished();
+    runDueTimers();
     curl_multi_poll(multi_, nullptr, 0, static_cast<int>(longestWait().count()), nullptr);
   }
 }
@@ -94,8 +104,10 @@ bool TransferThread::carryOut(Orders orders) {
     runHandler(std::move(handler), std::nullopt, std::nullopt, error);
   for (auto& [id, transfer] : orders.started) open(id, std::move(transfer));
   for (const ID id : orders.cancelled) end(id, transferError(TransferErrorCode::kCancelled));
+  for (auto& [at, work] : orders.timers) timers_.emplace(at, std::move(work));
   if (!stopBy_) return true;
 
+  timers_.clear();
   endAll(steady_clock::now() >= *stopBy_);
   if (!open_.empty()) return true;
   const std::lock_guard lock(mutex_);
@@ -131,6 +143,15 @@ void TransferThread::deliverFinished() {
   }
 }
 
+void TransferThread::runDueTimers() {
+  // Not those that are set by what runs here: transfers come in between.
+  const auto due = timers_.upper_bound(steady_clock::now());
+  std::vector<std::function<void()>> works;
+  for (auto timer = timers_.begin(); timer != due; timer = timers_.erase(timer))
+    works.push_back(std::move(timer->second));
+  for (const auto& work : works) guarded("What was to run after a pause", work);
+}
+
 void TransferThread::end(ID id, const RVError& error) {
   const auto entry = open_.find(id);
   if (entry == open_.end()) return;
@@ -149,32 +170,29 @@ void TransferThread::endAll(bool thoseThatMayEndLate) {
 
 milliseconds TransferThread::longestWait() const {
   constexpr milliseconds kUntilWoken = std::chrono::hours(1);
-  if (!stopBy_) return kUntilWoken;
-  if (open_.empty()) return milliseconds(0);
-  const auto left = std::chrono::ceil<milliseconds>(*stopBy_ - steady_clock::now());
-  return std::clamp(left, milliseconds(0), kUntilWoken);
+  const auto until = [&](steady_clock::time_point time) {
+    return std::clamp(
+        std::chrono::ceil<milliseconds>(time - steady_clock::now()), milliseconds(0), kUntilWoken);
+  };
+  if (!stopBy_) return timers_.empty() ? kUntilWoken : until(timers_.begin()->first);
+  return open_.empty() ? milliseconds(0) : until(*stopBy_);
+}
+
+void TransferThread::guarded(const char* what, const std::function<void()>& work) {
+  try {
+    work();
+  } catch (const std::exception& exception) {
+    logging::error(log_, "%@ threw: %@", {RVValue(what), RVValue(exception.what())});
+  } catch (...) {
+    logging::error(log_, "%@ threw something that is no std::exception", {RVValue(what)});
+  }
 }
 
 void TransferThread::runHandler(TKFacebookRequestHandler handler,
                                 std::optional<std::string> body,
                                 const std::optional<TKHTTPResponse>& response,
                                 const std::optional<RVError>& error) {
-  const auto report = [this](std::string_view what) {
-    log_.RVLog(kRVLogLevelError,
-               kRVLogFacilityDaemon,
-               "daemon/http/TransferThread",
-               "TransferThread::runHandler",
-               __LINE__,
-               "The handler of a transfer threw: %@",
-               {RVValue(what)});
-  };
-  try {
-    handler(body, response, error);
-  } catch (const std::exception& exception) {
-    report(exception.what());
-  } catch (...) {
-    report("something that is no std::exception");
-  }
+  guarded("The handler of a transfer", [&] { handler(body, response, error); });
   if (body) wipeText(*body);
 }
 

@@ -3,6 +3,7 @@
 
 #include <chrono>
 #include <cstdint>
+#include <functional>
 #include <map>
 #include <memory>
 #include <mutex>
@@ -64,6 +65,10 @@ class TransferThread {
   // once and runs no handler itself.
   void cancel(ID transfer);
 
+  // Has the work run on the transfer thread when the time has passed. It does not wait; what it throws is
+  // logged. It is destroyed unused where the thread is told to stop before.
+  void after(std::chrono::milliseconds time, std::function<void()> work);
+
   // Ends all transfers and the thread: each fails with kStopping, those with mayEndLate only after
   // they had `grace` to end by themselves. Returns when every handler has run and the thread has ended. Not
   // called from a handler.
@@ -74,11 +79,16 @@ class TransferThread {
     RVError error;
     TKFacebookRequestHandler handler;
   };
+  struct Timer {
+    std::chrono::steady_clock::time_point at;
+    std::function<void()> work;
+  };
   // What other threads have asked for since the transfer thread last looked.
   struct Orders {
     std::vector<std::pair<ID, std::unique_ptr<OpenTransfer>>> started;
     std::vector<Failure> failures;
     std::vector<ID> cancelled;
+    std::vector<Timer> timers;
     std::optional<std::chrono::steady_clock::time_point> stopBy;
   };
 
@@ -88,8 +98,11 @@ class TransferThread {
   void open(ID id, std::unique_ptr<OpenTransfer> transfer);
   void deliverFinished();
   void end(ID id, const RVError& error);
+  void runDueTimers();
   void endAll(bool thoseThatMayEndLate);
   std::chrono::milliseconds longestWait() const;
+  // Runs the work; what it throws is logged under the name of what it is.
+  void guarded(const char* what, const std::function<void()>& work);
   void runHandler(TKFacebookRequestHandler handler,
                   std::optional<std::string> body,
                   const std::optional<TKHTTPResponse>& response,
@@ -105,6 +118,7 @@ class TransferThread {
 
   // The transfer thread's own.
   std::map<ID, std::unique_ptr<OpenTransfer>> open_;
+  std::multimap<std::chrono::steady_clock::time_point, std::function<void()>> timers_;
   std::optional<std::chrono::steady_clock::time_point> stopBy_;
 
   std::mutex stopMutex_;  // one stop at a time

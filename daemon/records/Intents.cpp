@@ -20,20 +20,42 @@ base::Result<void> unlessNotFound(base::Result<void> result) {
   return result;
 }
 
-base::Result<void> complete(const Intent& intent, AuthorizationRecords& records, Accounts& accounts) {
+// What is taken away from, and by what.
+struct Stores {
+  AuthorizationRecords& records;
+  Accounts& accounts;
+  Outbox& outbox;
+};
+
+// Whether or not the plug-in had come to it: once a record is changed, nobody knows what it stood for.
+base::Result<void> owe(const AuthorizationRecord& record, const Stores& stores) {
+  const auto appId = appIDOf(record);
+  if (!appId) return {};
+  const auto owed = stores.outbox.owe(record.accountType, *appId, stores.accounts, stores.records);
+  return unlessNotFound(owed ? base::Result<void>() : owed.failure());
+}
+
+base::Result<void> removeRecords(const std::string& accountType, const Stores& stores) {
+  for (const AuthorizationRecord& record : stores.records.list(accountType))
+    if (auto owed = owe(record, stores); !owed) return owed;
+  return stores.records.removeAll(accountType);
+}
+
+base::Result<void> complete(const Intent& intent, const Stores& stores) {
   switch (intent.kind) {
     case Intent::Kind::kRevokeClient: {
-      auto record = records.find(intent.accountType, intent.subject);
+      auto record = stores.records.find(intent.accountType, intent.subject);
       if (!record) return {};
+      if (auto owed = owe(*record, stores); !owed) return owed;
       record->granted = false;
       record->permissions.reset();
-      return records.putForUser(*std::move(record));
+      return stores.records.putForUser(*std::move(record));
     }
     case Intent::Kind::kRevokeAll:
-      return records.removeAll(intent.accountType);
+      return removeRecords(intent.accountType, stores);
     case Intent::Kind::kRemoveAccount:
-      if (auto revoked = records.removeAll(intent.accountType); !revoked) return revoked;
-      return unlessNotFound(accounts.remove(intent.subject));
+      if (auto revoked = removeRecords(intent.accountType, stores); !revoked) return revoked;
+      return unlessNotFound(stores.accounts.retire(intent.subject));
   }
   return base::Failure{base::FailureKind::kDamaged, "nobody knows what was begun"};
 }
@@ -80,6 +102,7 @@ base::Result<void> Intents::finish(std::int64_t number) {
 
 base::Result<void> Intents::completeInterrupted(AuthorizationRecords& records,
                                                 Accounts& accounts,
+                                                Outbox& outbox,
                                                 RVLogService& log) {
   std::vector<Numbered> interrupted;
   auto read = database_.read([&](Connection& connection) -> base::Result<void> {
@@ -96,7 +119,7 @@ base::Result<void> Intents::completeInterrupted(AuthorizationRecords& records,
   });
   if (!read) return read;
   for (const auto& [number, intent] : interrupted) {
-    if (auto done = complete(intent, records, accounts); !done) return done;
+    if (auto done = complete(intent, {records, accounts, outbox}); !done) return done;
     logging::notice(log, describe(intent.kind), {RVValue(intent.subject), RVValue(intent.accountType)});
     if (auto finished = finish(number); !finished) return finished;
   }

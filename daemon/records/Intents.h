@@ -8,6 +8,7 @@
 #include "daemon/records/Accounts.h"
 #include "daemon/records/AuthorizationRecords.h"
 #include "daemon/records/Database.h"
+#include "daemon/records/Outbox.h"
 #include "host/RVLog.h"
 
 namespace records {
@@ -34,10 +35,11 @@ class Intents {
   base::Result<void> finish(std::int64_t number);
 
   // At start, before anybody is served: does what is left of each intent to records and accounts, with a
-  // log line for each, and crosses it out. Credentials are left to the keychain's reconcile(), to be called
-  // next.
+  // log line for each, and crosses it out. What the server has to be told goes to the outbox first; it may
+  // be told a second time. Credentials are left to the keychain's reconcile(), to be called next.
   base::Result<void> completeInterrupted(AuthorizationRecords& records,
                                          Accounts& accounts,
+                                         Outbox& outbox,
                                          RVLogService& log);
 
  private:

@@ -76,6 +76,20 @@ CREATE TABLE undeleted_credentials (
   PRIMARY KEY (account, client_id)
 ) STRICT, WITHOUT ROWID;
 )",
+    // To version 4. What was owed to the server before is not known any more.
+    R"(
+CREATE TABLE outbox (
+  number INTEGER PRIMARY KEY,
+  account_type TEXT NOT NULL,
+  account TEXT NOT NULL REFERENCES accounts (identifier),
+  app_id TEXT NOT NULL,
+  client_ids TEXT NOT NULL,
+  since INTEGER NOT NULL,
+  attempts INTEGER NOT NULL,
+  failure TEXT,
+  UNIQUE (account, app_id)
+) STRICT;
+)",
 };
 
 using Tables = std::vector<std::string>;
@@ -139,7 +153,7 @@ base::Result<void> checkSoundness(Connection& connection, std::int64_t version) 
   if (!statement) return statement.failure();
   const auto row = (*statement)->step();
   if (!row) return row.failure();
-  if (*row) return base::Failure{damaged, "a credential belongs to no account"};
+  if (*row) return base::Failure{damaged, "a credential or a revocation belongs to no account"};
   return {};
 }
 

@@ -9,7 +9,7 @@
 namespace records {
 
 // What the database's user_version says once it has all tables.
-inline constexpr std::int64_t kSchemaVersion = 3;
+inline constexpr std::int64_t kSchemaVersion = 4;
 
 base::Result<std::int64_t> schemaVersion(Connection& connection);
 

@@ -10,9 +10,8 @@
 #include <string>
 #include <thread>
 
-#include "daemon/http/FacebookRequests.h"
 #include "tests/fakes/FakeFacebookRequests.h"
-#include "tests/fakes/FakeTexts.h"
+#include "tests/support/FacebookParts.h"
 #include "tests/support/LoopbackServer.h"
 #include "tests/support/Outcome.h"
 
@@ -94,13 +93,8 @@ class DaemonHost final : public Host {
         changed_.wait(lock, [this] { return !isLate_; });
         connection.send(bytes_);
       }};
-  fakes::FakeLog log_;
-  http::TransferThread transfers_{log_};
-  http::FacebookRequests requests_{transfers_,
-                                   settingsFor(server_.url()),
-                                   [] { return std::nullopt; },
-                                   "",
-                                   log_};
+  support::FacebookParts parts_;
+  http::FacebookRequests& requests_ = parts_.requestsTo(settingsFor(server_.url()));
 };
 
 template <typename OneHost>

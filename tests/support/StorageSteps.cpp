@@ -31,8 +31,7 @@ struct Stores {
   explicit Stores(const std::string& path)
       : state(path),
         preferences(*state.directory, state.log) {
-    succeed(state.intents.completeInterrupted(*state.records, *state.accounts, state.log));
-    succeed(state.keychain->reconcile());
+    state.reconcile();
   }
 
   void storeCredential(const std::string& token) {

@@ -19,6 +19,7 @@
 #include "daemon/records/AuthorizationRecords.h"
 #include "daemon/records/Database.h"
 #include "daemon/records/Intents.h"
+#include "daemon/records/Outbox.h"
 #include "daemon/records/RequestStore.h"
 #include "daemon/state/Directory.h"
 #include "tests/fakes/FakeClient.h"
@@ -60,12 +61,20 @@ class StoredState {
             [this] { return now; },
             kKeepAccessLog),
         intents(*database),
+        outbox(*database, clock),
         credentialStore(makeStore(*this)),
         keychain(std::make_unique<credentials::Keychain>(*database, *credentialStore, log)) {}
 
   static std::unique_ptr<credentials::CredentialStore> sealedStore(StoredState& state) {
     return valueOf(
         credentials::SealedStore::open(*state.database, *state.directory, std::nullopt, state.log));
+  }
+
+  // What a start does before anybody is served.
+  void reconcile() {
+    succeed(intents.completeInterrupted(*records, *accounts, outbox, log));
+    succeed(outbox.eraseSettledAccounts(*accounts, log));
+    succeed(keychain->reconcile());
   }
 
   std::shared_ptr<records::RequestStore> storeFor(std::shared_ptr<requests::RequestContext> request) {
@@ -89,9 +98,9 @@ class StoredState {
   }
 
   // A record that the user made.
-  void put(const std::string& clientId, bool granted) {
-    succeed(
-        records->putForUser({std::string(RVAccountTypeIdentifierFacebook), clientId, granted, {}, {}, {}}));
+  void put(const std::string& clientId, bool granted, std::optional<RVDictionary> options = {}) {
+    succeed(records->putForUser(
+        {std::string(RVAccountTypeIdentifierFacebook), clientId, granted, {}, std::move(options), {}}));
   }
 
   std::optional<RVError> storeCredential(const std::string& clientId,
@@ -120,6 +129,7 @@ class StoredState {
   std::unique_ptr<records::AuthorizationRecords> records;
   records::AccessLog accessLog;
   records::Intents intents;
+  records::Outbox outbox;
   std::unique_ptr<credentials::CredentialStore> credentialStore;
   std::unique_ptr<credentials::Keychain> keychain;
 };

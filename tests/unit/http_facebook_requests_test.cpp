@@ -5,10 +5,9 @@
 #include <memory>
 #include <string>
 
-#include "daemon/http/FacebookRequests.h"
 #include "daemon/http/TransferErrors.h"
 #include "daemon/requests/RequestContext.h"
-#include "tests/fakes/FakeTexts.h"
+#include "tests/support/FacebookParts.h"
 #include "tests/support/LoopbackServer.h"
 #include "tests/support/Outcome.h"
 
@@ -23,7 +22,9 @@ using support::LoopbackConnection;
 using support::LoopbackServer;
 using support::Outcome;
 using support::PendingOutcome;
+using testing::ElementsAre;
 using testing::HasSubstr;
+using testing::IsEmpty;
 using testing::Not;
 using Fields = std::multimap<std::string, std::string>;
 
@@ -35,11 +36,10 @@ void expectError(const Outcome& outcome, TransferErrorCode code) {
 
 class AFacebookRequest : public testing::Test {
  protected:
-  std::shared_ptr<http::FacebookRequests> factoryFor(std::optional<std::string> url) {
+  http::FacebookRequests& factoryFor(std::optional<std::string> url) {
     http::FacebookServerSettings settings;
     settings.url = std::move(url);
-    return std::make_shared<http::FacebookRequests>(
-        transfers, settings, [this] { return masterToken; }, "de-AT, en", log);
+    return parts.requestsTo(settings, "de-AT, en");
   }
 
   // Answers once the test says so.
@@ -54,17 +54,23 @@ class AFacebookRequest : public testing::Test {
     return factory.initWithAppId("1", "org.example.App", RVPermissionSet{"email"}, std::nullopt);
   }
 
+  std::vector<std::string> owed() const {
+    std::vector<std::string> apps;
+    for (const auto& one : support::valueOf(parts.state.outbox.list())) apps.push_back(one.appId);
+    return apps;
+  }
+
   std::promise<void> release;
-  std::optional<RVSecret> masterToken{RVSecret("master-canary")};
-  fakes::FakeLog log;
-  http::TransferThread transfers{log};
+  mutable support::FacebookParts parts;
+  fakes::FakeLog& log = parts.state.log;
+  http::TransferThread& transfers = parts.transfers;
 };
 
 TEST_F(AFacebookRequest, ForAuthorizationSendsEverythingItHas) {
   const LoopbackServer server(httpAnswer("{}"));
   const auto request =
       factoryFor(server.url() + "/graph/")
-          ->initWithAppId("47 11", "org.example.App", RVPermissionSet{"user_photos", "email"}, "SELF");
+          .initWithAppId("47 11", "org.example.App", RVPermissionSet{"user_photos", "email"}, "SELF");
   request->setAccessToken(RVSecret("a-token"));
   PendingOutcome pending;
   request->performRequestWithHandler(pending.handler());
@@ -83,12 +89,12 @@ TEST_F(AFacebookRequest, ForAuthorizationSendsEverythingItHas) {
 
 TEST_F(AFacebookRequest, LeavesWhatIsAbsentOutAndSendsWhatIsEmpty) {
   const LoopbackServer server(httpAnswer("{}"));
-  const auto factory = factoryFor(server.url());
+  auto& factory = factoryFor(server.url());
   PendingOutcome absent;
-  factory->initWithAppId("1", "b", std::nullopt, std::nullopt)->performRequestWithHandler(absent.handler());
+  factory.initWithAppId("1", "b", std::nullopt, std::nullopt)->performRequestWithHandler(absent.handler());
   absent.wait();
   PendingOutcome empty;
-  factory->initWithAppId("", "", RVPermissionSet{}, "")->performRequestWithHandler(empty.handler());
+  factory.initWithAppId("", "", RVPermissionSet{}, "")->performRequestWithHandler(empty.handler());
   empty.wait();
   EXPECT_EQ(server.heard().at(0).form(), (Fields{{"app_id", "1"}, {"bundle_id", "b"}}));
   EXPECT_EQ(server.heard().at(1).form(),
@@ -98,7 +104,7 @@ TEST_F(AFacebookRequest, LeavesWhatIsAbsentOutAndSendsWhatIsEmpty) {
 
 TEST_F(AFacebookRequest, ForADescriptionSendsThePermissionsAndTheAudience) {
   const LoopbackServer server(httpAnswer("\"do odd things\""));
-  const auto request = factoryFor(server.url())->initWithPermissions({"b", "a"}, "EVERYONE");
+  const auto request = factoryFor(server.url()).initWithPermissions({"b", "a"}, "EVERYONE");
   request->setAccessToken(RVSecret("a-token"));
   PendingOutcome pending;
   request->performRequestWithHandler(pending.handler());
@@ -110,7 +116,7 @@ TEST_F(AFacebookRequest, ForADescriptionSendsThePermissionsAndTheAudience) {
 TEST_F(AFacebookRequest, MayBeLetGoOfOnceItHasBeenStarted) {
   LoopbackServer server(whenReleased());
   PendingOutcome pending;
-  authorization(*factoryFor(server.url()))->performRequestWithHandler(pending.handler());
+  authorization(factoryFor(server.url()))->performRequestWithHandler(pending.handler());
   ASSERT_TRUE(server.waitForRequests(1));
   release.set_value();
   EXPECT_EQ(pending.wait().body, "\"late\"");
@@ -118,7 +124,7 @@ TEST_F(AFacebookRequest, MayBeLetGoOfOnceItHasBeenStarted) {
 
 TEST_F(AFacebookRequest, WithoutAServerSaysSoAndNotOnTheCallersStack) {
   PendingOutcome pending;
-  authorization(*factoryFor(std::nullopt))->performRequestWithHandler(pending.handler());
+  authorization(factoryFor(std::nullopt))->performRequestWithHandler(pending.handler());
   const Outcome outcome = pending.wait();
   expectError(outcome, TransferErrorCode::kNoServer);
   EXPECT_THAT(outcome.errorText(), HasSubstr("[Server]"));
@@ -127,7 +133,7 @@ TEST_F(AFacebookRequest, WithoutAServerSaysSoAndNotOnTheCallersStack) {
 
 TEST_F(AFacebookRequest, ToAServerThatMayNotBeUsedSaysWhy) {
   PendingOutcome pending;
-  authorization(*factoryFor("http://facebook.example"))->performRequestWithHandler(pending.handler());
+  authorization(factoryFor("http://facebook.example"))->performRequestWithHandler(pending.handler());
   const Outcome outcome = pending.wait();
   expectError(outcome, TransferErrorCode::kServerNotAllowed);
   EXPECT_THAT(outcome.errorText(), HasSubstr("is plain http"));
@@ -145,13 +151,13 @@ TEST_F(AFacebookRequest, ThatWillNotBeSentIsKnownBeforehand) {
 
 TEST_F(AFacebookRequest, ForANameThatWouldReadAsTwoIsNotSent) {
   const LoopbackServer server(httpAnswer("{}"));
-  const auto factory = factoryFor(server.url());
+  auto& factory = factoryFor(server.url());
   PendingOutcome first;
-  factory->initWithAppId("1", "b", RVPermissionSet{"odd,email"}, std::nullopt)
+  factory.initWithAppId("1", "b", RVPermissionSet{"odd,email"}, std::nullopt)
       ->performRequestWithHandler(first.handler());
   expectError(first.wait(), TransferErrorCode::kNotSendable);
   PendingOutcome second;
-  factory->initWithPermissions({"odd,email"}, std::nullopt)->performRequestWithHandler(second.handler());
+  factory.initWithPermissions({"odd,email"}, std::nullopt)->performRequestWithHandler(second.handler());
   expectError(second.wait(), TransferErrorCode::kNotSendable);
   EXPECT_EQ(server.connectionCount(), 0);
 }
@@ -184,7 +190,7 @@ class AFacebookRequestOfARequest : public AFacebookRequest {
 TEST_F(AFacebookRequestOfARequest, CountsAsWaitingUntilItsAnswerHasCome) {
   LoopbackServer server(whenReleased());
   std::promise<int> waitingInHandler;
-  perform(*factoryFor(server.url()),
+  perform(factoryFor(server.url()),
           [&](const auto&, const auto&, const auto&) { waitingInHandler.set_value(limiter->waiting); });
   EXPECT_EQ(limiter->waiting, 1);
   release.set_value();
@@ -194,7 +200,7 @@ TEST_F(AFacebookRequestOfARequest, CountsAsWaitingUntilItsAnswerHasCome) {
 TEST_F(AFacebookRequestOfARequest, HandlesItsAnswerAsThatRequest) {
   const LoopbackServer server(httpAnswer("{}"));
   std::promise<std::shared_ptr<RequestContext>> current;
-  perform(*factoryFor(server.url()),
+  perform(factoryFor(server.url()),
           [&](const auto&, const auto&, const auto&) { current.set_value(RequestContext::current()); });
   EXPECT_EQ(current.get_future().get(), context);
 }
@@ -204,7 +210,7 @@ TEST_F(AFacebookRequestOfARequest, EndsWhenTheRequestBecomesVoid) {
     EXPECT_TRUE(connection.waitUntilClientGoes());
   });
   PendingOutcome pending;
-  perform(*factoryFor(server.url()), pending.handler());
+  perform(factoryFor(server.url()), pending.handler());
   ASSERT_TRUE(server.waitForRequests(1));
   context->makeVoid(VoidReason::kCallerGone);
   expectError(pending.wait(), TransferErrorCode::kCancelled);
@@ -214,7 +220,7 @@ TEST_F(AFacebookRequestOfARequest, IsAnsweredAndNotSentWhereTheRequestIsVoid) {
   const LoopbackServer server(httpAnswer("{}"));
   context->makeVoid(VoidReason::kClientRevoked);
   PendingOutcome pending;
-  perform(*factoryFor(server.url()), pending.handler());
+  perform(factoryFor(server.url()), pending.handler());
   const Outcome outcome = pending.wait();
   expectError(outcome, TransferErrorCode::kCancelled);
   EXPECT_NE(outcome.thread, std::this_thread::get_id());
@@ -225,7 +231,7 @@ TEST_F(AFacebookRequestOfARequest, IsAnsweredAndNotSentWhereNoMoreMayWait) {
   const LoopbackServer server(httpAnswer("{}"));
   limiter->isFull = true;
   PendingOutcome pending;
-  perform(*factoryFor(server.url()), pending.handler());
+  perform(factoryFor(server.url()), pending.handler());
   expectError(pending.wait(), TransferErrorCode::kCancelled);
   EXPECT_EQ(context->voidReason(), VoidReason::kLimitReached);
   EXPECT_EQ(server.connectionCount(), 0);
@@ -233,13 +239,13 @@ TEST_F(AFacebookRequestOfARequest, IsAnsweredAndNotSentWhereNoMoreMayWait) {
 
 TEST_F(AFacebookRequestOfARequest, IsAnsweredOnceHoweverTheAnswerAndTheEndMeet) {
   const LoopbackServer server(httpAnswer("{}"));
-  const auto factory = factoryFor(server.url());
+  auto& factory = factoryFor(server.url());
   for (int i = 0; i < 200; ++i) {
     const auto one = std::make_shared<RequestContext>("client", nullptr);
     PendingOutcome pending;
     {
       const RequestContext::Scope scope(one);
-      authorization(*factory)->performRequestWithHandler(pending.handler());
+      authorization(factory)->performRequestWithHandler(pending.handler());
     }
     if (i % 4 != 0) std::this_thread::yield();
     one->makeVoid(VoidReason::kCallerGone);
@@ -252,7 +258,7 @@ TEST_F(AFacebookRequestOfARequest, EndsWithTheDaemon) {
   LoopbackServer server(
       [](LoopbackConnection& connection, const HeardRequest&) { connection.waitUntilClientGoes(); });
   PendingOutcome pending;
-  perform(*factoryFor(server.url()), pending.handler());
+  perform(factoryFor(server.url()), pending.handler());
   ASSERT_TRUE(server.waitForRequests(1));
   transfers.stop(std::chrono::milliseconds(0));
   expectError(pending.wait(), TransferErrorCode::kStopping);
@@ -263,7 +269,7 @@ class ARevocation : public AFacebookRequest {};
 
 TEST_F(ARevocation, IsSignedWithTheMasterToken) {
   LoopbackServer server(httpAnswer("whatever"));
-  factoryFor(server.url())->initSession()->revokeAccessTokenForAppWithID("4711");
+  factoryFor(server.url()).initSession()->revokeAccessTokenForAppWithID("4711");
   ASSERT_TRUE(server.waitForRequests(1));
   const HeardRequest heard = server.heard().at(0);
   EXPECT_EQ(heard.path(), "/revoke");
@@ -275,8 +281,8 @@ TEST_F(ARevocation, IsSignedWithTheMasterToken) {
 
 TEST_F(ARevocation, WithoutAMasterTokenIsSentUnsigned) {
   LoopbackServer server(httpAnswer("whatever"));
-  masterToken.reset();
-  factoryFor(server.url())->initSession()->revokeAccessTokenForAppWithID("4711");
+  parts.masterToken.reset();
+  factoryFor(server.url()).initSession()->revokeAccessTokenForAppWithID("4711");
   ASSERT_TRUE(server.waitForRequests(1));
   EXPECT_THAT(server.heard().at(0).head, Not(HasSubstr("Authorization")));
 }
@@ -286,20 +292,20 @@ TEST_F(ARevocation, IsSentForAVoidRequestToo) {
   const auto context = std::make_shared<RequestContext>("client", nullptr);
   context->makeVoid(VoidReason::kCallerGone);
   const RequestContext::Scope scope(context);
-  factoryFor(server.url())->initSession()->revokeAccessTokenForAppWithID("4711");
+  factoryFor(server.url()).initSession()->revokeAccessTokenForAppWithID("4711");
   EXPECT_TRUE(server.waitForRequests(1));
 }
 
 TEST_F(ARevocation, MayEndLateWhenTheDaemonStops) {
   LoopbackServer server(httpAnswer("whatever"));
-  factoryFor(server.url())->initSession()->revokeAccessTokenForAppWithID("4711");
+  factoryFor(server.url()).initSession()->revokeAccessTokenForAppWithID("4711");
   transfers.stop(std::chrono::hours(1));
   EXPECT_EQ(server.heard().size(), 1u);
 }
 
 TEST_F(ARevocation, ThatFailsIsLoggedWithoutTheToken) {
-  factoryFor(std::nullopt)->initSession()->revokeAccessTokenForAppWithID("4711");
-  factoryFor("http://facebook.example")->initSession()->revokeAccessTokenForAppWithID("4712");
+  factoryFor(std::nullopt).initSession()->revokeAccessTokenForAppWithID("4711");
+  factoryFor("http://facebook.example").initSession()->revokeAccessTokenForAppWithID("4712");
   transfers.stop(std::chrono::hours(1));
   ASSERT_EQ(log.texts().size(), 2u);
   EXPECT_THAT(log.texts()[0], HasSubstr("4711"));
@@ -309,10 +315,129 @@ TEST_F(ARevocation, ThatFailsIsLoggedWithoutTheToken) {
 
 TEST_F(ARevocation, NeedsNoBodyInItsAnswer) {
   LoopbackServer server(httpAnswer(""));
-  factoryFor(server.url())->initSession()->revokeAccessTokenForAppWithID("4711");
+  factoryFor(server.url()).initSession()->revokeAccessTokenForAppWithID("4711");
   transfers.stop(std::chrono::hours(1));
   EXPECT_EQ(server.heard().size(), 1u);
+  EXPECT_THAT(owed(), IsEmpty());
   EXPECT_TRUE(log.texts().empty());
+}
+
+TEST_F(ARevocation, IsOwedWhenItReturns) {
+  LoopbackServer server(whenReleased());
+  factoryFor(server.url()).initSession()->revokeAccessTokenForAppWithID("4711");
+  EXPECT_THAT(owed(), ElementsAre("4711"));
+  release.set_value();
+}
+
+TEST_F(ARevocation, ThatCannotBeWrittenDownThrows) {
+  support::succeed(parts.state.accounts->remove(parts.state.accounts->list().at(0).identifier));
+  const auto session = factoryFor("http://127.0.0.1:1").initSession();
+  EXPECT_THROW(session->revokeAccessTokenForAppWithID("4711"), std::runtime_error);
+}
+
+// A server that answers revocations when the test says so, and then with what it says.
+class AnAuthorizationOfARevokedApp : public AFacebookRequestOfARequest {
+ protected:
+  void revoke() { factory.initSession()->revokeAccessTokenForAppWithID("1"); }
+  void answerRevocations(std::string bytes) { revocationAnswer.set_value(std::move(bytes)); }
+  std::vector<std::string> heard() const {
+    std::vector<std::string> paths;
+    for (const HeardRequest& request : server.heard()) paths.push_back(request.path());
+    return paths;
+  }
+
+  std::promise<std::string> revocationAnswer;
+  LoopbackServer server{[answer = revocationAnswer.get_future().share()](LoopbackConnection& connection,
+                                                                         const HeardRequest& request) {
+    connection.send(request.path() == "/revoke" ? answer.get() : httpAnswer("{}"));
+  }};
+  http::FacebookRequests& factory = factoryFor(server.url());
+};
+
+TEST_F(AnAuthorizationOfARevokedApp, ReachesTheServerAfterTheRevocationWasAnswered) {
+  revoke();
+  PendingOutcome first;
+  PendingOutcome second;
+  perform(factory, first.handler());
+  perform(factory, second.handler());
+  ASSERT_TRUE(server.waitForRequests(1));
+  EXPECT_FALSE(first.hasCome());
+  EXPECT_EQ(limiter->waiting, 1);
+  answerRevocations(httpAnswer("{}"));
+  EXPECT_EQ(first.wait().body, "{}");
+  EXPECT_EQ(second.wait().body, "{}");
+  EXPECT_THAT(heard(), ElementsAre("/revoke", "/authorize", "/authorize"));
+  EXPECT_EQ(limiter->waiting, 0);
+}
+
+TEST_F(AnAuthorizationOfARevokedApp, FailsWithTheRevocationsErrorAndIsNotSent) {
+  revoke();
+  PendingOutcome pending;
+  perform(factory, pending.handler());
+  answerRevocations("");
+  const Outcome outcome = pending.wait();
+  expectError(outcome, TransferErrorCode::kConnectionBroken);
+  EXPECT_NE(outcome.thread, std::this_thread::get_id());
+  EXPECT_THAT(heard(), ElementsAre("/revoke"));
+  EXPECT_THAT(owed(), ElementsAre("1"));
+}
+
+TEST_F(AnAuthorizationOfARevokedApp, EndsWhenItsRequestBecomesVoidAndLeavesTheRevocationAlone) {
+  revoke();
+  const auto other = std::make_shared<RequestContext>("other", nullptr);
+  PendingOutcome ended;
+  perform(factory, ended.handler());
+  PendingOutcome waiting;
+  {
+    const RequestContext::Scope scope(other);
+    authorization(factory)->performRequestWithHandler(waiting.handler());
+  }
+  context->makeVoid(VoidReason::kCallerGone);
+  expectError(ended.wait(), TransferErrorCode::kCancelled);
+  EXPECT_FALSE(waiting.hasCome());
+  answerRevocations(httpAnswer("{}"));
+  EXPECT_EQ(waiting.wait().body, "{}");
+  EXPECT_THAT(heard(), ElementsAre("/revoke", "/authorize"));
+  EXPECT_THAT(owed(), IsEmpty());
+}
+
+TEST_F(AnAuthorizationOfARevokedApp, EndsWhenItsRequestBecomesVoidAfterTheRevocationToo) {
+  std::promise<void> isGone;
+  LoopbackServer slow([&](LoopbackConnection& connection, const HeardRequest& request) {
+    if (request.path() == "/revoke") {
+      connection.send(httpAnswer("{}"));
+    } else {
+      EXPECT_TRUE(connection.waitUntilClientGoes());
+      isGone.set_value();
+    }
+  });
+  http::FacebookRequests& toSlow = factoryFor(slow.url());
+  toSlow.initSession()->revokeAccessTokenForAppWithID("1");
+  PendingOutcome pending;
+  perform(toSlow, pending.handler());
+  ASSERT_TRUE(slow.waitForRequests(2));
+  context->makeVoid(VoidReason::kCallerGone);
+  expectError(pending.wait(), TransferErrorCode::kCancelled);
+  isGone.get_future().wait();
+}
+
+TEST_F(AnAuthorizationOfARevokedApp, EndsWithTheDaemon) {
+  revoke();
+  PendingOutcome pending;
+  perform(factory, pending.handler());
+  ASSERT_TRUE(server.waitForRequests(1));
+  transfers.stop(std::chrono::milliseconds(0));
+  expectError(pending.wait(), TransferErrorCode::kStopping);
+  EXPECT_THAT(owed(), ElementsAre("1"));
+  answerRevocations("");
+}
+
+TEST_F(AnAuthorizationOfARevokedApp, DoesNotConcernOtherApps) {
+  revoke();
+  PendingOutcome pending;
+  factory.initWithAppId("2", "b", std::nullopt, std::nullopt)->performRequestWithHandler(pending.handler());
+  EXPECT_EQ(pending.wait().body, "{}");
+  answerRevocations("");
 }
 
 }  // namespace

@@ -524,4 +524,48 @@ TEST_F(ATransfer, ThatFailsBeforeItBeginsFailsOnTheTransferThread) {
   EXPECT_NE(outcome.thread, std::this_thread::get_id());
 }
 
+class ATimer : public ATransfer {};
+
+TEST_F(ATimer, RunsItsWorkOnceOnTheTransferThreadWhenItsTimeHasCome) {
+  std::vector<std::string> ran;
+  std::promise<std::thread::id> done;
+  thread.after(std::chrono::hours(1), [&] { ran.emplace_back("in an hour"); });
+  thread.after(std::chrono::milliseconds(20), [&] {
+    ran.emplace_back("later");
+    done.set_value(std::this_thread::get_id());
+  });
+  thread.after(std::chrono::milliseconds(0), [&] { ran.emplace_back("at once"); });
+  EXPECT_NE(done.get_future().get(), std::this_thread::get_id());
+  thread.stop(std::chrono::milliseconds(0));
+  EXPECT_EQ(ran, (std::vector<std::string>{"at once", "later"}));
+}
+
+TEST_F(ATimer, MaySetAnotherOneAndLetsTransfersIn) {
+  const LoopbackServer server(httpAnswer("x"));
+  std::atomic<bool> goesOn = true;
+  std::function<void()> again = [&] {
+    if (goesOn) thread.after(std::chrono::milliseconds(0), again);
+  };
+  again();
+  EXPECT_EQ(exchangeWith(server).body, "x");
+  goesOn = false;
+}
+
+TEST_F(ATimer, IsDroppedWhenTheThreadStops) {
+  auto held = std::make_shared<int>();
+  thread.after(std::chrono::hours(1), [held] {});
+  thread.stop(std::chrono::hours(1));
+  EXPECT_EQ(held.use_count(), 1);
+  thread.after(std::chrono::milliseconds(0), [held] {});
+  EXPECT_EQ(held.use_count(), 1);
+}
+
+TEST_F(ATimer, SurvivesWorkThatThrows) {
+  std::promise<void> done;
+  thread.after(std::chrono::milliseconds(0), [] { throw std::runtime_error("the work's fault"); });
+  thread.after(std::chrono::milliseconds(1), [&] { done.set_value(); });
+  done.get_future().wait();
+  EXPECT_THAT(log.texts(), testing::ElementsAre(HasSubstr("the work's fault")));
+}
+
 }  // namespace

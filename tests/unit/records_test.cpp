@@ -421,11 +421,16 @@ class InterruptedWork : public StoredRecords {
   // What the next start does.
   void restart() {
     reopen();
-    succeed(state_->intents.completeInterrupted(*state_->records, *state_->accounts, state_->log));
-    succeed(state_->keychain->reconcile());
+    state_->reconcile();
   }
   bool holdsCredential(const std::string& id) {
     return state_->keychain->credentialForAccount(*state_->account(), id) != nullptr;
+  }
+
+  std::vector<std::string> owedApps() {
+    std::vector<std::string> apps;
+    for (const auto& owed : valueOf(state_->outbox.list())) apps.push_back(owed.appId);
+    return apps;
   }
 
   std::string account_;
@@ -476,6 +481,36 @@ TEST_F(InterruptedWork, RevokesAll) {
   EXPECT_FALSE(holdsCredential("one"));
   EXPECT_FALSE(holdsCredential("two"));
   EXPECT_NE(state_->keychain->credentialForAccount(*state_->account(), std::nullopt), nullptr);
+}
+
+TEST_F(InterruptedWork, OwesTheServerWhatItsPlugInHadNotComeTo) {
+  state_->put("one", true, RVDictionary{{"app_id", "1"}});
+  state_->put("two", false, RVDictionary{{"app_id", "2"}});
+  valueOf(state_->intents.begin({records::Intent::Kind::kRevokeClient, kType, "one"}));
+  restart();
+  EXPECT_THAT(owedApps(), ElementsAre("1"));
+  EXPECT_THAT(valueOf(state_->outbox.list()).at(0).clientIds, ElementsAre("one"));
+  valueOf(state_->intents.begin({records::Intent::Kind::kRevokeAll, kType, ""}));
+  restart();
+  EXPECT_THAT(owedApps(), ElementsAre("1", "2"));
+  restart();
+  EXPECT_THAT(owedApps(), ElementsAre("1", "2"));
+}
+
+TEST_F(InterruptedWork, KeepsTheTokenOfARemovedAccountForWhatIsOwed) {
+  state_->put("one", true, RVDictionary{{"app_id", "1"}});
+  valueOf(state_->intents.begin({records::Intent::Kind::kRemoveAccount, kType, account_}));
+  restart();
+  EXPECT_TRUE(state_->accounts->list().empty());
+  ASSERT_EQ(valueOf(state_->accounts->retired()).size(), 1u);
+  const auto owed = valueOf(state_->outbox.list());
+  ASSERT_EQ(owed.size(), 1u);
+  EXPECT_EQ(owed[0].account, account_);
+  EXPECT_FALSE(state_->accounts->remove(account_)) << "what is owed could not be signed any more";
+  succeed(state_->outbox.remove(owed[0]));
+  restart();
+  EXPECT_TRUE(valueOf(state_->accounts->retired()).empty());
+  EXPECT_THAT(state_->log.texts(), Contains(HasSubstr("it is erased now")));
 }
 
 TEST_F(InterruptedWork, RemovesTheAccount) {

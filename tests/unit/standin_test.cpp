@@ -7,12 +7,11 @@
 #include <sstream>
 #include <string>
 
-#include "daemon/http/FacebookRequests.h"
 #include "daemon/http/JSONReader.h"
 #include "daemon/http/TransferErrors.h"
 #include "standin-server/StandInServer.h"
-#include "tests/fakes/FakeTexts.h"
 #include "tests/support/Certificates.h"
+#include "tests/support/FacebookParts.h"
 #include "tests/support/Outcome.h"
 
 namespace {
@@ -41,8 +40,7 @@ class TheStandInServer : public testing::Test {
     http::FacebookServerSettings settings;
     settings.url = server->url();
     settings.timeout = timeout;
-    requests = std::make_unique<http::FacebookRequests>(
-        transfers, settings, [] { return RVSecret("master-canary"); }, language, daemonLog);
+    requests = &parts.requestsTo(settings, language);
   }
 
   template <typename Request>
@@ -94,9 +92,8 @@ class TheStandInServer : public testing::Test {
   std::unique_ptr<standin::Script> script;
   std::unique_ptr<standin::RequestLog> log;
   std::unique_ptr<standin::StandInServer> server;
-  fakes::FakeLog daemonLog;
-  http::TransferThread transfers{daemonLog};
-  std::unique_ptr<http::FacebookRequests> requests;
+  support::FacebookParts parts;
+  http::FacebookRequests* requests = nullptr;  // of parts
 };
 
 TEST_F(TheStandInServer, IssuesAnotherTokenEachTimeForWhatItWasAskedFor) {
@@ -116,10 +113,10 @@ TEST_F(TheStandInServer, SaysWhatATokenWasIssuedForUntilItIsRevoked) {
   EXPECT_EQ(whoAmI(token, &body), 200);
   EXPECT_THAT(body, HasSubstr("org.example.App"));
   requests->initSession()->revokeAccessTokenForAppWithID("4711");
-  transfers.stop(std::chrono::hours(1));
+  parts.transfers.stop(std::chrono::hours(1));
   EXPECT_EQ(whoAmI(token), 401);
   EXPECT_EQ(whoAmI(other), 200) << "another application's token is left alone";
-  EXPECT_TRUE(daemonLog.texts().empty());
+  EXPECT_TRUE(parts.state.log.texts().empty());
 }
 
 TEST_F(TheStandInServer, ChecksTheToken) {
@@ -220,7 +217,7 @@ TEST_F(TheStandInServer, LogsWhatItWasAskedAndNoToken) {
   const std::string token = member(authorize(), "access_token");
   perform(requests->initWithAppId("4711", "master-canary and " + token, std::nullopt, std::nullopt));
   requests->initSession()->revokeAccessTokenForAppWithID("4711");
-  transfers.stop(std::chrono::hours(1));
+  parts.transfers.stop(std::chrono::hours(1));
   const std::string lines = logged();
   EXPECT_EQ(std::count(lines.begin(), lines.end(), '\n'), 3);
   EXPECT_THAT(lines, HasSubstr(R"("permissions":"email,odd")"));
@@ -322,11 +319,8 @@ TEST_F(TheStandInProgram, ServesHTTPSWithACertificate) {
   http::FacebookServerSettings settings;
   settings.url = server.url();
   settings.caFile = write("-ca.pem", authority.pem());
-  fakes::FakeLog daemonLog;
-  http::TransferThread transfers(daemonLog);
-  http::FacebookRequests requests(
-      transfers, settings, [] { return std::nullopt; }, "", daemonLog);
-  const auto request = requests.initWithAppId("1", "b", std::nullopt, std::nullopt);
+  support::FacebookParts parts;
+  const auto request = parts.requestsTo(settings).initWithAppId("1", "b", std::nullopt, std::nullopt);
   request->setAccessToken(RVSecret("any"));
   PendingOutcome pending;
   request->performRequestWithHandler(pending.handler());

@@ -125,6 +125,9 @@ class Manager:
     def revoke_all(self):
         return self._call("RevokeAllAccess", "(s)", FACEBOOK)
 
+    def pending_revocations(self, account_type=FACEBOOK):
+        return self._call("ListPendingRevocations", "(s)", account_type)
+
     def forget_refusal(self, client_id):
         return self._call("ForgetRefusal", "(ss)", FACEBOOK, client_id)
 

@@ -11,10 +11,13 @@ OPENER = urllib.request.build_opener(urllib.request.ProxyHandler({}))
 
 
 class Standin:
-    """script: the answers that it gives in order before its usual ones. descriptions: text by permission."""
+    """script: the answers that it gives in order before its usual ones. descriptions: text by permission. log: a
+    file for what it was asked."""
 
-    def __init__(self, world, script=(), descriptions=None):
-        arguments = [world.programs.standin]
+    def __init__(self, world, script=(), descriptions=None, port=0, log=None):
+        arguments = [world.programs.standin, "--port", port]
+        if log is not None:
+            arguments += ["--log", log]
         if script:
             path = os.path.join(world.root, "standin.json")
             with open(path, "w", encoding="utf-8") as file:
@@ -35,7 +38,16 @@ class Standin:
             assert error.code == 401
             return None
 
-    def dispose(self):
+    @property
+    def port(self):
+        return int(self.url.rsplit(":", 1)[1])
+
+    def end(self):
+        """Ends it; nobody listens at its port any more."""
         status = self._process.end()
         self._process.assert_no_sanitizer_report()
         assert status == 0, f"rvd-standin ended with {status}:\n{self._process.stderr.text}"
+
+    def dispose(self):
+        if self._process.running:
+            self.end()
