@@ -3,6 +3,7 @@
 
 #include "base/Text.h"
 #include "cli/Commands.h"
+#include "cli/ServerAnswer.h"
 #include "cli/Token.h"
 
 namespace cli {
@@ -37,12 +38,15 @@ ExitStatus listAccounts(Session& session) {
 }
 
 ExitStatus removeAccount(Session& session, const std::string& accountID) {
+  ServerAnswer server(session.service, std::nullopt);
   const auto removed = session.service.removeAccount(accountID);
   if (!removed) return session.output.failed(removed.failure());
+  const auto [word, text] = server.wait();
   if (session.output.wantsJSON())
-    session.output.print(Json::object({{"removed", accountID}}));
+    session.output.print(Json::object({{"removed", accountID}, {"server", word}}));
   else
-    session.output.print("Removed the account " + base::visible(accountID) + ".\n");
+    session.output.print("Removed the account " + base::visible(accountID) + " from this device.\n" + text +
+                         "\n");
   return ExitStatus::kDone;
 }
 

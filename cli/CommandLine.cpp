@@ -39,6 +39,7 @@ struct CommandLine {
   Text language;
   bool all = false;
   bool online = false;
+  bool pending = false;
   std::function<ExitStatus(Session&)> chosen;
 };
 
@@ -167,8 +168,15 @@ void addAccessCommand(CommandLine& line) {
 
 void addAuthorizationCommands(CommandLine& line) {
   constexpr const char* kClient = "the application's ID, as 'rvctl list' shows it";
-  addCommand(
-      line, &line.app, "list", "List the applications that were granted or refused", listAuthorizations);
+  CLI::App* listing =
+      addCommand(line,
+                 &line.app,
+                 "list",
+                 "List the applications that were granted or refused",
+                 [&line](Session& session) {
+                   return line.pending ? listPendingRevocations(session) : listAuthorizations(session);
+                 });
+  listing->add_flag("--pending", line.pending, "list what the server has yet to be told instead");
   CLI::App* authorizing = addCommand(
       line, &line.app, "authorize", "Grant an application access, without asking", [&line](Session& session) {
         return authorize(session, *line.subject);

@@ -32,6 +32,7 @@ ExitStatus showAccess(Session& session,
 
 // list, authorize, revoke, forget, log
 ExitStatus listAuthorizations(Session& session);
+ExitStatus listPendingRevocations(Session& session);
 ExitStatus authorize(Session& session, const std::string& clientID);
 ExitStatus revoke(Session& session, const std::string& clientID);
 ExitStatus revokeAll(Session& session);

@@ -44,14 +44,16 @@ Json documentOf(const AccessError& error) {
 ExitStatus printDecision(Output& output,
                          const Decision& decision,
                          const char* key,
-                         const char* done,
-                         const char* notDone) {
+                         const std::string& done,
+                         const char* notDone,
+                         const std::vector<std::pair<std::string, std::string>>& others) {
   if (output.wantsJSON()) {
     Json document = Json::object({{key, decision.granted}, {"error", nullptr}});
     if (decision.error) document["error"] = documentOf(*decision.error);
+    for (const auto& [name, value] : others) document[name] = value;
     output.print(document);
   } else if (decision.granted) {
-    output.print(std::string(done) + "\n");
+    output.print(done + "\n");
   } else {
     output.print(notDone + (decision.error ? " " + reasonText(*decision.error) : std::string()) + "\n");
   }

@@ -47,4 +47,26 @@ ExitStatus listAuthorizations(Session& session) {
   return ExitStatus::kDone;
 }
 
+ExitStatus listPendingRevocations(Session& session) {
+  const auto pending = session.service.pendingRevocations();
+  if (!pending) return session.output.failed(pending.failure());
+  if (session.output.wantsJSON()) {
+    session.output.print(Json::object({{"pending", *pending}}));
+    return ExitStatus::kDone;
+  }
+  if (pending->empty()) {
+    session.output.print(std::string("The server has been told of everything.\n"));
+    return ExitStatus::kDone;
+  }
+  std::vector<std::vector<std::string>> rows;
+  for (const Json& owed : *pending)
+    rows.push_back({joined(owed.value("client_ids", Json::array())),
+                    owed.value("app_id", ""),
+                    timeText(owed.value("since", 0LL)),
+                    std::to_string(owed.value("attempts", 0LL)),
+                    owed.value("failure", "-")});
+  session.output.print(tableOf({"CLIENTS", "APP ID", "REVOKED", "ATTEMPTS", "LAST FAILURE"}, rows));
+  return ExitStatus::kDone;
+}
+
 }  // namespace cli

@@ -1,7 +1,10 @@
 #include "cli/Service.h"
 
+#include <poll.h>
 #include <sdbus-c++/sdbus-c++.h>
 
+#include <algorithm>
+#include <cerrno>
 #include <limits>
 #include <map>
 #include <nlohmann/json.hpp>
@@ -77,17 +80,21 @@ Dictionary dictionaryOf(const RequestOptions& options) {
 
 }  // namespace
 
-// Listens to no signal: it is never registered for any.
+// Listens to signals only once it is registered for them.
 class Service::Proxy final
     : public sdbus::ProxyInterfaces<com::zentor::rvd::Accounts1_proxy, com::zentor::rvd::Management1_proxy> {
  public:
   explicit Proxy(sdbus::IConnection& connection)
       : ProxyInterfaces(connection, base::kServiceName, base::kObjectPath) {}
 
+  bool haveAuthorizationsChanged = false;
+
  private:
   void onAccessChanged(const std::string&) override {}
   void onAccountsChanged() override {}
-  void onAuthorizationsChanged(const std::string&) override {}
+  void onAuthorizationsChanged(const std::string& accountType) override {
+    if (accountType == kAccountType) haveAuthorizationsChanged = true;
+  }
 };
 
 Service::Service(Connect connect)
@@ -164,6 +171,32 @@ base::Result<Decision> Service::revoke(const std::string& clientID) {
 
 base::Result<Decision> Service::revokeAll() {
   return call([](Proxy& rvd) { return decisionFrom(rvd.RevokeAllAccess(kAccountType)); });
+}
+
+base::Result<Json> Service::pendingRevocations() {
+  return call([](Proxy& rvd) { return documentOf(rvd.ListPendingRevocations(kAccountType)); });
+}
+
+base::Result<void> Service::watchAuthorizations() {
+  return call([](Proxy& rvd) { rvd.registerProxy(); });
+}
+
+base::Result<bool> Service::waitForAuthorizations(std::chrono::steady_clock::time_point until) {
+  return call([&](Proxy& rvd) {
+    for (;;) {
+      while (connection_->processPendingRequest()) continue;
+      if (std::exchange(rvd.haveAuthorizationsChanged, false)) return true;
+      const auto left =
+          std::chrono::ceil<std::chrono::milliseconds>(until - std::chrono::steady_clock::now());
+      if (left.count() <= 0) return false;
+      const auto bus = connection_->getEventLoopPollData();
+      const int ownTime = bus.getPollTimeout();
+      const int time = static_cast<int>(left.count());
+      pollfd polled{bus.fd, bus.events, 0};
+      if (::poll(&polled, 1, ownTime < 0 ? time : std::min(time, ownTime)) < 0 && errno != EINTR)
+        throw sdbus::Error(busError("Disconnected"), "poll");
+    }
+  });
 }
 
 base::Result<void> Service::forgetRefusal(const std::string& clientID) {

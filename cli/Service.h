@@ -1,6 +1,7 @@
 // The daemon, as rvctl calls it.
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <memory>
@@ -67,6 +68,7 @@ class Service {
   base::Result<Decision> authorize(const std::string& clientID);
   base::Result<Decision> revoke(const std::string& clientID);
   base::Result<Decision> revokeAll();
+  base::Result<Json> pendingRevocations();
   base::Result<void> forgetRefusal(const std::string& clientID);
   base::Result<Json> accessLog(std::uint32_t limit);
   base::Result<Json> explain(const std::string& clientID, const ExplainOptions& options);
@@ -78,6 +80,11 @@ class Service {
   base::Result<void> resetPreference(const std::string& applicationID, const std::string& key);
   // Has everybody who keeps preferences read them anew.
   base::Result<void> announcePreferences();
+
+  // Has changes of authorizations and pending revocations noticed from now on.
+  base::Result<void> watchAuthorizations();
+  // Waits for a change that was not waited for yet; false where none has come in time.
+  base::Result<bool> waitForAuthorizations(std::chrono::steady_clock::time_point until);
 
  private:
   class Proxy;
