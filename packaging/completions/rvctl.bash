@@ -42,6 +42,7 @@ _rvctl() {
     access) words="--json --as --credential-fd" ;;
     explain) words="--json --app-id --permissions --audience --language --online $(_rvctl_clients)" ;;
     authorize | forget) words="--json $(_rvctl_clients)" ;;
+    list) words="--json --pending" ;;
     revoke) words="--json --all $(_rvctl_clients)" ;;
     log) words="--json --client --since --until --limit" ;;
     "preference "*) words="--json --application TKFacebookIgnoreAccessRequests" ;;

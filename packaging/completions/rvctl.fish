@@ -45,6 +45,7 @@ complete -c rvctl -n '__fish_seen_subcommand_from explain' -l language -x -d 'Th
 complete -c rvctl -n '__fish_seen_subcommand_from explain' -l online -d 'Have the server describe unknown permissions'
 complete -c rvctl -n '__fish_seen_subcommand_from access' -l credential-fd -x -d 'Write its token to this descriptor'
 complete -c rvctl -n '__fish_seen_subcommand_from explain authorize revoke forget' -a '(__rvctl_clients)'
+complete -c rvctl -n "__fish_seen_subcommand_from list; and not __fish_seen_subcommand_from account" -l pending -d 'What the server has yet to be told'
 complete -c rvctl -n '__fish_seen_subcommand_from revoke' -l all -d 'Of every application'
 complete -c rvctl -n '__fish_seen_subcommand_from log' -l client -x -a '(__rvctl_clients)' -d 'Of this application alone'
 complete -c rvctl -n '__fish_seen_subcommand_from log' -l since -x -d 'From this day or time on'

@@ -164,6 +164,7 @@ def test_every_change_of_a_record_is_announced_without_saying_whose(world):
         (MANAGEMENT, "RemoveAccount", ["string:1"]),
         (MANAGEMENT, "AuthorizeAccess", [f"string:{FACEBOOK}", "string:a"]),
         (MANAGEMENT, "RevokeAccess", [f"string:{FACEBOOK}", "string:a"]),
+        (MANAGEMENT, "ListPendingRevocations", [f"string:{FACEBOOK}"]),
         (MANAGEMENT, "ForgetRefusal", [f"string:{FACEBOOK}", "string:a"]),
         (MANAGEMENT, "GetPreference", ["string:a", "string:b"]),
         (MANAGEMENT, "ResetPreference", ["string:a", "string:b"]),

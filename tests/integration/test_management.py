@@ -407,6 +407,7 @@ def test_only_a_refusal_can_be_forgotten(world):
         ("AuthorizeAccess", "(ss)", ("com.zentor.other", PHOTO)),
         ("RevokeAccess", "(ss)", ("com.zentor.other", PHOTO)),
         ("RevokeAllAccess", "(s)", ("com.zentor.other",)),
+        ("ListPendingRevocations", "(s)", ("com.zentor.other",)),
         ("ForgetRefusal", "(ss)", ("com.zentor.other", PHOTO)),
     ],
 )

@@ -10,9 +10,9 @@ import threading
 import pytest
 
 from harness.agent import ALLOW
-from harness.application import FACEBOOK
 from harness.bus import MANAGEMENT
-from harness.expect import GRANTED, INVALID_ARGS, REFUSED_WITHOUT_ERROR, TRANSFER_DOMAIN, UNSUPPORTED_TYPE, bus_error
+from harness.expect import GRANTED, INVALID_ARGS, REFUSED_WITHOUT_ERROR, TRANSFER_DOMAIN, bus_error
+from harness.processes import run
 from harness.server import answer
 from harness.standin import Standin
 
@@ -312,15 +312,6 @@ def test_a_request_that_waits_for_a_revocation_ends_when_its_client_is_revoked_a
     assert granted.access() == ("none", [], {})
 
 
-def test_what_is_owed_is_listed_by_the_type_of_account(wired_world, wire, granted):
-    wire.always("/revoke", dead_end)
-    manager = wired_world.manager()
-    manager.revoke(PHOTO)
-    assert len(manager.pending_revocations(FACEBOOK)) == 1
-    with bus_error(UNSUPPORTED_TYPE):
-        manager.pending_revocations("com.zentor.other")
-
-
 def test_no_secret_is_said_on_the_way(wired_world, wire, granted):
     token = granted.token()
     wire.on("/revoke", broken)
@@ -331,3 +322,19 @@ def test_no_secret_is_said_on_the_way(wired_world, wire, granted):
     for secret in (token, "master-token"):
         assert secret not in seen
         assert secret not in wired_world.logs()
+
+
+def test_rvctl_says_what_the_server_knows(wired_world, wire, granted):
+    def rvctl(*arguments):
+        status, out, _ = run([wired_world.programs.rvctl, *arguments], wired_world.environment)
+        assert status == 0
+        return out
+
+    wire.always("/revoke", broken)
+    out = rvctl("revoke", PHOTO)
+    assert out.startswith("Access revoked on this device.\nThe server has not been told yet: ")
+    assert "4711" in rvctl("list", "--pending")
+    wire.always("/revoke", answer("{}"))
+    assert rvctl("revoke", PHOTO) == "Access revoked on this device.\nThe server has been told.\n"
+    assert rvctl("list", "--pending") == "The server has been told of everything.\n"
+    assert rvctl("revoke", OTHER) == "Access revoked on this device.\nThere was nothing to tell the server.\n"

@@ -11,13 +11,14 @@ import subprocess
 import pytest
 from gi.repository import GLib
 
-from harness.bus import BusError
+from harness.bus import MANAGEMENT, PATH, BusError
 from harness.fake_rvd import HELD, FakeRvd
 from harness.processes import Process
 from harness.terminal import INTERRUPT, Terminal
 
 TOKEN = "EAAB-the-token-that-nobody-may-see"
 FACEBOOK = "com.zentor.facebook"
+PHOTO = "org.example.PhotoApp"
 PREFERENCES = "com.zentor.tessel.facebook"
 CHANGED = "TKFacebookEnvironmentDidChangeNotification"
 DONE, REFUSED, WRONG_USE, IMPOSSIBLE = 0, 1, 2, 3
@@ -83,7 +84,10 @@ def tools(bare_world):
 
 @pytest.fixture
 def rvd(tools):
-    return tools.run_daemon()
+    daemon = tools.run_daemon()
+    # What commands look at beside what they do.
+    daemon.answers["ListAuthorizations"] = daemon.answers["ListPendingRevocations"] = dictionaries()
+    return daemon
 
 
 def decision(granted, **error):
@@ -221,9 +225,11 @@ def test_no_accounts_are_listed_as_none(tools, rvd):
 
 
 def test_an_account_is_removed(tools, rvd):
-    assert tools.run("account", "remove", "id-1").out == "Removed the account id-1.\n"
-    assert tools.json("account", "remove", "id-1") == (DONE, {"removed": "id-1"})
-    assert [call.values for call in rvd.calls] == [("id-1",)] * 2
+    assert tools.run("account", "remove", "id-1").out == (
+        "Removed the account id-1 from this device.\nThere was nothing to tell the server.\n"
+    )
+    assert tools.json("account", "remove", "id-1") == (DONE, {"removed": "id-1", "server": "nothing"})
+    assert [call.values for call in rvd.calls if call.method == "RemoveAccount"] == [("id-1",)] * 2
 
 
 # ---- request ----
@@ -479,24 +485,25 @@ def test_no_authorizations_are_listed_as_none(tools, rvd):
     assert tools.json("list") == (DONE, {"authorizations": []})
 
 
+REVOKED = "Access revoked on this device.\nThere was nothing to tell the server.\n"
 DIRECT = [
-    (["authorize", "org.example.PhotoApp"], "AuthorizeAccess", (FACEBOOK, "org.example.PhotoApp"), "granted"),
-    (["revoke", "org.example.PhotoApp"], "RevokeAccess", (FACEBOOK, "org.example.PhotoApp"), "revoked"),
-    (["revoke", "--all"], "RevokeAllAccess", (FACEBOOK,), "revoked"),
+    (["authorize", PHOTO], "AuthorizeAccess", (FACEBOOK, PHOTO), "granted", ("Access granted.\n", {})),
+    (["revoke", PHOTO], "RevokeAccess", (FACEBOOK, PHOTO), "revoked", (REVOKED, {"server": "nothing"})),
+    (["revoke", "--all"], "RevokeAllAccess", (FACEBOOK,), "revoked", (REVOKED, {"server": "nothing"})),
 ]
 
 
-@pytest.mark.parametrize("arguments, method, values, word", DIRECT)
-def test_a_direct_change_is_made(tools, rvd, arguments, method, values, word):
+@pytest.mark.parametrize("arguments, method, values, word, said", DIRECT)
+def test_a_direct_change_is_made(tools, rvd, arguments, method, values, word, said):
     rvd.answers[method] = decision(True)
     outcome = tools.run(*arguments)
-    assert (outcome.status, outcome.out) == (DONE, f"Access {word}.\n")
-    assert tools.json(*arguments) == (DONE, {"succeeded": True, "error": None})
-    assert [(call.method, call.values) for call in rvd.calls] == [(method, values)] * 2
+    assert (outcome.status, outcome.out) == (DONE, said[0])
+    assert tools.json(*arguments) == (DONE, {"succeeded": True, "error": None, **said[1]})
+    assert [call.values for call in rvd.calls if call.method == method] == [values] * 2
 
 
-@pytest.mark.parametrize("arguments, method, values, word", DIRECT)
-def test_a_direct_change_that_is_refused_says_so(tools, rvd, arguments, method, values, word):
+@pytest.mark.parametrize("arguments, method, values, word, said", DIRECT)
+def test_a_direct_change_that_is_refused_says_so(tools, rvd, arguments, method, values, word, said):
     rvd.answers[method] = decision(False, **access_error(6))
     outcome = tools.run(*arguments)
     assert outcome.status == REFUSED
@@ -505,6 +512,92 @@ def test_a_direct_change_that_is_refused_says_so(tools, rvd, arguments, method, 
         "succeeded": False,
         "error": {"domain": "com.zentor.accounts", "code": 6},
     }
+
+
+def owed(attempts=0, client=PHOTO, **others):
+    """What is pending: one revocation."""
+    return dictionaries(
+        {
+            "client_ids": GLib.Variant("as", [client]),
+            "app_id": text("4711"),
+            "since": GLib.Variant("x", 1714566600),
+            "attempts": GLib.Variant("x", attempts),
+            **others,
+        }
+    )
+
+
+class Server:
+    """What a daemon says of what it owes the server: these answers in order, the last one for good. It tells of each
+    change when it has been asked."""
+
+    def __init__(self, rvd, *answers):
+        self.rvd = rvd
+        self.answers = list(answers)
+        rvd.answers["ListAuthorizations"] = RECORDS
+        rvd.answers["RevokeAccess"] = rvd.answers["RevokeAllAccess"] = decision(True)
+        rvd.answers["ListPendingRevocations"] = self.answer
+
+    def answer(self, _call):
+        if len(self.answers) == 1:
+            return self.answers[0]
+        GLib.idle_add(self.announce)
+        return self.answers.pop(0)
+
+    def announce(self):
+        self.rvd.connection.gio.emit_signal(
+            None, PATH, MANAGEMENT, "AuthorizationsChanged", GLib.Variant("(s)", (FACEBOOK,))
+        )
+
+
+FAILURE = {"failure": text("it is\x1b]0; off")}
+
+
+@pytest.mark.parametrize("arguments", [["revoke", PHOTO], ["revoke", "--all"], ["account", "remove", "id-1"]])
+@pytest.mark.parametrize(
+    "answers, word, words",
+    [
+        ([dictionaries(), dictionaries()], "told", "The server has been told."),
+        ([dictionaries(), owed(), dictionaries()], "told", "The server has been told."),
+        ([owed(3, **FAILURE), owed(3, **FAILURE), dictionaries()], "told", "The server has been told."),
+        ([dictionaries(), owed(), owed(1, **FAILURE)], "pending", "has not been told yet: it is\\x1b]0; off"),
+        ([owed(3, **FAILURE), owed(4, **FAILURE)], "pending", "has not been told yet: it is\\x1b]0; off"),
+        ([dictionaries(), BusError("com.zentor.rvd.Error.Failed", "no")], "unknown", "is not known"),
+        ([BusError("com.zentor.rvd.Error.Failed", "no")], "unknown", "is not known"),
+    ],
+    ids=["at once", "a little later", "after failures", "not yet", "still not", "no word of it", "never a word of it"],
+)
+def test_a_revocation_says_whether_the_server_has_been_told(tools, rvd, arguments, answers, word, words):
+    Server(rvd, *answers)
+    outcome = tools.run(*arguments)
+    assert outcome.status == DONE
+    first, _, rest = outcome.out.partition("\n")
+    assert "this device" in first
+    assert words in rest
+    assert ("rvctl list --pending" in rest) == (word != "told")
+    Server(rvd, *answers)
+    status, document = tools.json(*arguments)
+    assert (status, document["server"]) == (DONE, word)
+
+
+def test_what_is_owed_for_another_client_does_not_count(tools, rvd):
+    Server(rvd, owed(1, client="org.example.Game"))
+    assert tools.json("revoke", PHOTO)[1]["server"] == "told"
+
+
+def test_what_is_pending_is_listed(tools, rvd):
+    tools.world.environment["TZ"] = "UTC"
+    rvd.answers["ListPendingRevocations"] = owed(2, **FAILURE)
+    outcome = tools.run("list", "--pending")
+    assert (outcome.status, outcome.out) == (
+        DONE,
+        "CLIENTS               APP ID  REVOKED              ATTEMPTS  LAST FAILURE\n"
+        "org.example.PhotoApp  4711    2024-05-01 12:30:00  2         it is\\x1b]0; off\n",
+    )
+    assert tools.json("list", "--pending") == (DONE, {"pending": owed(2, **FAILURE).unpack()[0]})
+    rvd.answers["ListPendingRevocations"] = dictionaries()
+    assert tools.run("list", "--pending").out == "The server has been told of everything.\n"
+    assert tools.json("list", "--pending") == (DONE, {"pending": []})
 
 
 def test_a_refusal_is_forgotten(tools, rvd):
@@ -657,6 +750,7 @@ COMMANDS = {
     "access --as": (["access", "--as", "org.example.A"], "Register"),
     "explain": (["explain", "org.example.A"], "ExplainAccess"),
     "list": (["list"], "ListAuthorizations"),
+    "list --pending": (["list", "--pending"], "ListPendingRevocations"),
     "authorize": (["authorize", "org.example.A"], "AuthorizeAccess"),
     "revoke": (["revoke", "org.example.A"], "RevokeAccess"),
     "revoke --all": (["revoke", "--all"], "RevokeAllAccess"),
