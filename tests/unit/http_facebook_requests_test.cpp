@@ -140,12 +140,12 @@ TEST_F(AFacebookRequest, ToAServerThatMayNotBeUsedSaysWhy) {
 }
 
 TEST_F(AFacebookRequest, ThatWillNotBeSentIsKnownBeforehand) {
-  const auto factory = factoryFor("https://facebook.example");
-  EXPECT_EQ(factory->problemWithSending(RVPermissionSet{"email", "odd"}), std::nullopt);
-  EXPECT_EQ(factory->problemWithSending(std::nullopt), std::nullopt);
-  EXPECT_EQ(factory->problemWithSending(RVPermissionSet{"odd,email"})->code,
+  const auto& factory = factoryFor("https://facebook.example");
+  EXPECT_EQ(factory.problemWithSending(RVPermissionSet{"email", "odd"}), std::nullopt);
+  EXPECT_EQ(factory.problemWithSending(std::nullopt), std::nullopt);
+  EXPECT_EQ(factory.problemWithSending(RVPermissionSet{"odd,email"})->code,
             static_cast<std::int64_t>(TransferErrorCode::kNotSendable));
-  EXPECT_EQ(factoryFor(std::nullopt)->problemWithSending(std::nullopt)->code,
+  EXPECT_EQ(factoryFor(std::nullopt).problemWithSending(std::nullopt)->code,
             static_cast<std::int64_t>(TransferErrorCode::kNoServer));
 }
 
