@@ -174,7 +174,7 @@ struct Daemon::Work {
   http::Revocations::Means meansOfRevocations(Storage& storage) {
     return {
         [&storage](const std::string& account) { return ownToken(account, *storage.credentialStore); },
-        [&storage](const std::string& account) { return storage.keychain->eraseAccount(account); },
+        [&storage](const std::string& account) { storage.keychain->eraseAccount(account); },
         [this](const std::string& appID, std::optional<RVSecret> token, TKFacebookRequestHandler handler) {
           server.beginRevocation(appID, std::move(token), std::move(handler));
         },

@@ -134,14 +134,7 @@ void Revocations::accountWasRetired(const std::string& account) {
     const std::lock_guard lock(mutex_);
     isRemoved = !isOwedForAccount(account) && removeIfRetired(account);
   }
-  if (isRemoved) erase(account);
-}
-
-void Revocations::erase(const std::string& account) {
-  if (const auto erased = means_.erase(account); !erased)
-    logging::error(log_,
-                   "What is stored for the removed account %@ is deleted at the next start only: %@",
-                   {RVValue(account), RVValue(erased.failure().message)});
+  if (isRemoved) means_.erase(account);
 }
 
 // One try of an entry that is marked as being tried. Called without the lock.
@@ -177,7 +170,7 @@ void Revocations::attempted(const Key& key, std::optional<RVError> error) {
   announce(consequences.changedType);
   // Where no thread is left for it, the next start does it.
   if (const std::string& account = consequences.removedAccount; !account.empty())
-    (void)means_.run([this, account] { erase(account); });
+    (void)means_.run([this, account] { means_.erase(account); });
   for (const Continuation& continuation : consequences.continuations) continuation(consequences.error);
   if (consequences.tryAgain) attempt(key);
 }

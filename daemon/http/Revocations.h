@@ -38,7 +38,7 @@ class Revocations {
     // The own token of an account, also of a retired one; absent where it is lost. May take its time.
     std::function<base::Result<std::optional<RVSecret>>(const std::string& account)> tokenOf;
     // Deletes what is stored for an account that has just been removed. May take its time.
-    std::function<base::Result<void>(const std::string& account)> erase;
+    std::function<void(const std::string& account)> erase;
     // Begins the exchange and returns at once; see FacebookServer::beginRevocation.
     std::function<void(const std::string& appID, std::optional<RVSecret>, TKFacebookRequestHandler)> send;
     // Returns at once and runs the work when the pause is over, on a thread where it must not wait; not at
@@ -122,7 +122,6 @@ class Revocations {
   bool isOwedForApp(const std::string& appID) const;
   bool isOwedForAccount(const std::string& account) const;
   bool removeIfRetired(const std::string& account);
-  void erase(const std::string& account);
   std::vector<Continuation> takeWaiters(const std::string& appID);
   void announce(const std::string& accountType) const;
 

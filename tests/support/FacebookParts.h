@@ -27,7 +27,7 @@ class FacebookParts {
         http::Revocations::Stores{state.outbox, *state.accounts, *state.records},
         http::Revocations::Means{
             [this](const std::string&) { return masterToken; },
-            [this](const std::string& account) { return state.keychain->eraseAccount(account); },
+            [this](const std::string& account) { state.keychain->eraseAccount(account); },
             [&server](const auto& appID, auto token, auto handler) {
               server.beginRevocation(appID, std::move(token), std::move(handler));
             },

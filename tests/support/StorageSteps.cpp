@@ -78,7 +78,7 @@ std::string tell(Stores& stores) {
     return base::Result<std::optional<RVSecret>>(
         valueOf(stores.state.credentialStore->read({account, std::nullopt})).value().oauthToken());
   };
-  means.erase = [&](const std::string& account) { return stores.state.keychain->eraseAccount(account); };
+  means.erase = [&](const std::string& account) { stores.state.keychain->eraseAccount(account); };
   means.send = [&](const std::string& appId, const auto& token, const auto& answered) {
     told += ", " + std::string(token->reveal()) + " forgets " + appId;
     answered("{}", TKHTTPResponse{200}, std::nullopt);

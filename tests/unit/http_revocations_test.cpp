@@ -58,7 +58,7 @@ class AnOwedRevocation : public testing::Test {
     means.tokenOf = [this](const std::string& id) { return ownToken(id); };
     means.erase = [this](const std::string& id) {
       erased.push_back(id);
-      return state->keychain->eraseAccount(id);
+      state->keychain->eraseAccount(id);
     };
     means.send = [this](const std::string& appID, std::optional<RVSecret> token, auto handler) {
       sent.push_back({appID, token ? std::optional(std::string(token->reveal())) : std::nullopt, handler});
