@@ -124,7 +124,7 @@ def test_a_marker_that_never_answers_makes_its_program_unknown_and_holds_nobody_
     for _ in range(20):
         assert program(world).connection.call(MANAGEMENT, "ListAccounts") == []
     assert raw._answer() == {"error": ACCESS_DENIED}
-    assert "took too long" in world.logs()
+    world.daemon.stderr.wait_for("took too long")
     world.stop_daemon()  # with a thread that still waits for the file
 
 

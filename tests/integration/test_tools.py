@@ -83,7 +83,7 @@ def test_access_is_granted_used_and_taken_away(person):
 
     (record,) = person.ask("list")[1]["authorizations"]
     assert (record["client_id"], record["name"], record["granted"]) == (PHOTO_APP, "Photo App", True)
-    assert person.ask("revoke", PHOTO_APP) == (DONE, {"succeeded": True, "error": None})
+    assert person.ask("revoke", PHOTO_APP) == (DONE, {"succeeded": True, "error": None, "server": "told"})
     assert person.ask("access", "--as", PHOTO_APP)[0] == REFUSED
     entries = person.ask("log")[1]["entries"]
     assert [(entry["granted"], entry["requested"]) for entry in entries] == [(False, False), (True, True)]
@@ -153,14 +153,14 @@ def test_ignoring_requests_is_in_effect_at_once(person):
 
 def test_a_client_is_authorized_directly(person):
     assert person.ask("authorize", PHOTO_APP) == (DONE, {"succeeded": True, "error": None})
-    assert person.ask("revoke", "--all") == (DONE, {"succeeded": True, "error": None})
+    assert person.ask("revoke", "--all") == (DONE, {"succeeded": True, "error": None, "server": "nothing"})
 
 
 def test_an_account_is_removed(person):
     (account,) = person.ask("account", "list")[1]["accounts"]
     assert account["username"] == "ada"
     assert person.ask("account", "remove", "another")[0] == IMPOSSIBLE
-    assert person.ask("account", "remove", account["id"]) == (DONE, {"removed": account["id"]})
+    assert person.ask("account", "remove", account["id"]) == (DONE, {"removed": account["id"], "server": "nothing"})
     assert person.ask("account", "list") == (DONE, {"accounts": []})
     status, document = outcome(person.start_request())
     assert status == REFUSED

@@ -376,13 +376,13 @@ TEST_F(TheStoredAccessLog, LosesWhatIsTooOldAsNewEntriesCome) {
 }
 
 TEST_F(TheStoredAccessLog, LosesWhatIsTooOldWhenItIsPruned) {
-  state_->accessLog.RVDLogAccessRequest(kType, "app", true, true, 0);
+  state_->accessLog.RVDLogAccessRequest(kType, "org.example.Pruned", true, true, 0);
   succeed(state_->accessLog.prune());
   EXPECT_EQ(valueOf(state_->accessLog.newest(10)).size(), 1U);
   state_->now += support::StoredState::kKeepAccessLog + std::chrono::seconds(1);
   succeed(state_->accessLog.prune());
   EXPECT_TRUE(valueOf(state_->accessLog.newest(10)).empty());
-  EXPECT_FALSE(isOnDisk("app"));
+  EXPECT_FALSE(isOnDisk("org.example.Pruned"));
 }
 
 TEST_F(TheStoredAccessLog, OutlivesTheRecord) {
