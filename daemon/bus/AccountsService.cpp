@@ -167,21 +167,15 @@ void AccountsService::getCredential(const std::shared_ptr<Call>& call) {
   const auto identity = identityOfConnection(parts_, call->sender(), accountType);
   if (!identity.application) throw sdbus::Error(kNoAccess, "The caller holds no access");
   checkRate(call->sender());
-  dispatcher_.onPool(
-      call, [this, call, accountType, id = identity.application->id, evidence = identity.evidence] {
-        const auto holdsAccess = [&] {
-          const auto record = parts_.records.find(accountType, id);
-          return record && record->granted && record->evidence <= evidence;
-        };
-        const auto accounts = parts_.accounts.listOfType(accountType);
-        const auto credential = accounts.empty() || !holdsAccess()
-                                    ? nullptr
-                                    : parts_.keychain.credentialForClient(accounts.front().identifier, id);
-        // Asked again: while the credential was read, it may have become somebody else's.
-        if (credential == nullptr || !holdsAccess())
-          throw sdbus::Error(kNoAccess, "The caller holds no access");
-        call->reply([&](sdbus::MethodReply& reply) { writeCredential(reply, *credential); });
-      });
+  dispatcher_.onPool(call, [this, call, accountType, identity] {
+    const auto accounts = parts_.accounts.listOfType(accountType);
+    const auto credential =
+        accounts.empty() ? nullptr
+                         : parts_.keychain.credentialForClient(
+                               accounts.front().identifier, identity.application->id, identity.evidence);
+    if (credential == nullptr) throw sdbus::Error(kNoAccess, "The caller holds no access");
+    call->reply([&](sdbus::MethodReply& reply) { writeCredential(reply, *credential); });
+  });
 }
 
 void AccountsService::accessChanged(const std::string& accountType,

@@ -60,17 +60,21 @@ base::Result<Keychain::Standing> Keychain::standing(const Place& place) {
   return standing;
 }
 
-bool Keychain::mayBeRead(const Place& place, bool onlyGranted) {
+bool Keychain::mayBeRead(const Place& place, std::optional<clients::Evidence> client) {
   const auto found = standing(place);
   if (!found)
     logging::error(log_,
                    "Whether the credential of account %@, %@, may be read cannot be found out: %@",
                    {RVValue(place.accountId), ownerOf(place), RVValue(found.failure().message)});
-  return found && found->isOfAnAccount && !found->isDeleted && (found->isGranted || !onlyGranted);
+  if (!found || !found->isOfAnAccount || found->isDeleted) return false;
+  if (!client) return true;
+  const Request writer = writerOf(place);
+  return found->isGranted && found->evidence <= *client && (!writer || writer->evidence() <= *client);
 }
 
-std::shared_ptr<const RVAccountCredential> Keychain::read(const Place& place, bool onlyGranted) {
-  if (!mayBeRead(place, onlyGranted)) return nullptr;
+std::shared_ptr<const RVAccountCredential> Keychain::read(const Place& place,
+                                                          std::optional<clients::Evidence> client) {
+  if (!mayBeRead(place, client)) return nullptr;
   auto credential = store_.read(place);
   if (!credential) {
     logging::error(log_,
@@ -80,7 +84,7 @@ std::shared_ptr<const RVAccountCredential> Keychain::read(const Place& place, bo
   }
   storeHasWorked();
   // While the store was read, access may have been taken away.
-  if (!*credential || !mayBeRead(place, onlyGranted)) return nullptr;
+  if (!*credential || !mayBeRead(place, client)) return nullptr;
   return std::make_shared<const RVAccountCredential>(**std::move(credential));
 }
 
@@ -158,7 +162,7 @@ base::Result<void> Keychain::remove(const Place& place) {
 std::shared_ptr<const RVAccountCredential> Keychain::credentialForAccount(
     const RVAccount& account,
     const std::optional<std::string>& clientID) {
-  return read({account.identifier(), clientID}, false);
+  return read({account.identifier(), clientID}, std::nullopt);
 }
 
 std::optional<RVError> Keychain::setCredentialForAccount(const RVAccount& account,
@@ -169,12 +173,13 @@ std::optional<RVError> Keychain::setCredentialForAccount(const RVAccount& accoun
   const Place place{account.identifier(), clientID};
   const Request request = requestOf(account);
   auto error = changeFor(request, place, [&] {
-    auto stored = store(place, *credential);
-    if (!stored) return stored;
-    const std::lock_guard lock(mutex_);
-    std::erase_if(writers_, [](const auto& entry) { return entry.second.expired(); });
-    writers_.insert_or_assign(place, request);
-    return stored;
+    {
+      // Before it is stored, so that nobody reads it who may not.
+      const std::lock_guard lock(mutex_);
+      std::erase_if(writers_, [](const auto& entry) { return entry.second.expired(); });
+      writers_.insert_or_assign(place, request);
+    }
+    return store(place, *credential);
   });
   if (!error) storeHasWorked();
   return error;
@@ -194,8 +199,9 @@ base::Result<void> Keychain::setMasterCredential(const std::string& accountId, R
 }
 
 std::shared_ptr<const RVAccountCredential> Keychain::credentialForClient(const std::string& accountId,
-                                                                         const std::string& clientId) {
-  return read({accountId, clientId}, true);
+                                                                         const std::string& clientId,
+                                                                         clients::Evidence evidence) {
+  return read({accountId, clientId}, evidence);
 }
 
 base::Result<void> Keychain::eraseClients(const std::string& accountId,

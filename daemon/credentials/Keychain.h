@@ -43,10 +43,12 @@ class Keychain : public RVDKeychainManager {
   // no such account.
   base::Result<void> setMasterCredential(const std::string& accountId, RVSecret token);
 
-  // What a client may be handed: its credential, and null unless a granted record stands for it at this
-  // very moment.
+  // What a client that is known by this evidence may be handed: its credential, and null unless a granted
+  // record of no stronger evidence stands for it at this very moment, and no request of stronger evidence
+  // has stored it for a record that is yet to come.
   std::shared_ptr<const RVAccountCredential> credentialForClient(const std::string& accountId,
-                                                                 const std::string& clientId);
+                                                                 const std::string& clientId,
+                                                                 clients::Evidence evidence);
 
   // Deletes the client's credential, or, where none is named, that of every client of the account; also what
   // no record stands for, as a request that became void may have stored it.
@@ -77,8 +79,10 @@ class Keychain : public RVDKeychainManager {
   };
 
   base::Result<Standing> standing(const Place& place);
-  bool mayBeRead(const Place& place, bool onlyGranted);
-  std::shared_ptr<const RVAccountCredential> read(const Place& place, bool onlyGranted);
+  // client: how the client is known that asks; absent where the daemon itself does.
+  bool mayBeRead(const Place& place, std::optional<clients::Evidence> client);
+  std::shared_ptr<const RVAccountCredential> read(const Place& place,
+                                                  std::optional<clients::Evidence> client);
   // What the store owes is done, now that a call of it has succeeded.
   void storeHasWorked();
   std::optional<RVError> changeFor(const Request& request,

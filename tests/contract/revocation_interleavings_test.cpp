@@ -136,7 +136,8 @@ class Interleavings : public ::testing::Test {
   std::string read(std::size_t client) {
     const auto record = state_.records->find(kType, kClients[client]);
     if (!record || !record->granted) return "";
-    const auto credential = state_.keychain->credentialForClient(account_, kClients[client]);
+    const auto credential =
+        state_.keychain->credentialForClient(account_, kClients[client], clients::Evidence::kRegistered);
     return credential != nullptr ? std::string(credential->oauthToken().reveal()) : "";
   }
 

@@ -70,6 +70,26 @@ TEST_F(ACredentialOfAClient, IsNotReplacedWhileARequestWithStrongerEvidenceThatS
   EXPECT_EQ(token(), "weak");
 }
 
+TEST_F(ACredentialOfAClient, IsHandedOutOnNoWeakerEvidenceThanItsRecordHas) {
+  const auto isHandedOut = [&](Evidence evidence) {
+    return state_.keychain->credentialForClient(account_, "app", evidence) != nullptr;
+  };
+  ASSERT_TRUE(store("strong", request(Evidence::kScope)));
+  record(Evidence::kScope);
+  EXPECT_FALSE(isHandedOut(Evidence::kRegistered));
+  EXPECT_TRUE(isHandedOut(Evidence::kScope));
+  EXPECT_TRUE(isHandedOut(Evidence::kSandbox));
+}
+
+TEST_F(ACredentialOfAClient, IsNotHandedOutOnTheStrengthOfAWeakerRecordThatItWasNotStoredFor) {
+  ASSERT_TRUE(store("weak", request(Evidence::kRegistered)));
+  record(Evidence::kRegistered);
+  const auto strong = request(Evidence::kSandbox);
+  ASSERT_TRUE(store("strong", strong));
+  EXPECT_EQ(state_.keychain->credentialForClient(account_, "app", Evidence::kRegistered), nullptr);
+  EXPECT_NE(state_.keychain->credentialForClient(account_, "app", Evidence::kSandbox), nullptr);
+}
+
 TEST_F(ACredentialOfAClient, IsTheUsersToChangeWhateverTheEvidence) {
   ASSERT_TRUE(store("strong", request(Evidence::kSandbox)));
   record(Evidence::kSandbox);

@@ -104,7 +104,7 @@ TEST_F(ASealedKeychain, OpensNoCredentialOfAnotherAccount) {
       "UPDATE credentials SET account = (SELECT identifier FROM accounts ORDER BY number DESC LIMIT 1) "
       "WHERE client_id = 'app'");
   state_->put("app", true);
-  EXPECT_EQ(state_->keychain->credentialForClient(second, "app"), nullptr);
+  EXPECT_EQ(state_->keychain->credentialForClient(second, "app", clients::Evidence::kRegistered), nullptr);
 }
 
 TEST_F(ASealedKeychain, CountsCredentialsAsAbsentWhenTheKeyIsLost) {
@@ -141,7 +141,9 @@ TEST_F(ASealedKeychain, StoresNothingForAnAccountThatIsGone) {
 
 TEST_F(ASealedKeychain, HandsAClientItsCredentialOnlyAsLongAsItHoldsAGrant) {
   ASSERT_FALSE(state_->storeCredential("app", "token"));
-  const auto handedOut = [&] { return state_->keychain->credentialForClient(account_, "app") != nullptr; };
+  const auto handedOut = [&] {
+    return state_->keychain->credentialForClient(account_, "app", clients::Evidence::kRegistered) != nullptr;
+  };
   EXPECT_FALSE(handedOut());
   state_->put("app", true);
   EXPECT_TRUE(handedOut());
@@ -152,7 +154,7 @@ TEST_F(ASealedKeychain, HandsAClientItsCredentialOnlyAsLongAsItHoldsAGrant) {
   EXPECT_FALSE(handedOut());
   succeed(state_->records->put({"another type", "app", true, {}, {}, {}}));
   EXPECT_FALSE(handedOut());
-  EXPECT_EQ(state_->keychain->credentialForClient(account_, ""), nullptr);
+  EXPECT_EQ(state_->keychain->credentialForClient(account_, "", clients::Evidence::kRegistered), nullptr);
 }
 
 TEST_F(ASealedKeychain, DeletesAtStartWhatNoGrantStandsFor) {

@@ -31,7 +31,9 @@ class AStoreOutOfReach : public ::testing::Test {
     state_.reset();
     state_ = makeState();
   }
-  bool isHandedOut() { return state_->keychain->credentialForClient(account_, "app") != nullptr; }
+  bool isHandedOut() {
+    return state_->keychain->credentialForClient(account_, "app", clients::Evidence::kRegistered) != nullptr;
+  }
   bool isReadByAPlugIn() {
     return state_->keychain->credentialForAccount(*state_->account(), "app") != nullptr;
   }
@@ -58,7 +60,8 @@ TEST_F(AStoreOutOfReach, StoresNothingAndSaysSo) {
   EXPECT_THAT(state_->log.texts(), Contains(HasSubstr("cannot be read: the store is gone")));
   store_->setFailing(false);
   EXPECT_TRUE(isHandedOut());
-  EXPECT_EQ(state_->keychain->credentialForClient(account_, "other"), nullptr);
+  EXPECT_EQ(state_->keychain->credentialForClient(account_, "other", clients::Evidence::kRegistered),
+            nullptr);
 }
 
 TEST_F(AStoreOutOfReach, DeletesWhatWasRevokedWhenItWorksAgain) {

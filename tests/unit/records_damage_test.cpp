@@ -50,7 +50,8 @@ class ADamagedDatabase : public ::testing::Test {
       EXPECT_THAT(before_, ::testing::Contains(record)) << what << ": " << record.clientId;
     bool isWhole = after.size() == before_.size();
     for (const auto& record : before_) {
-      const auto credential = state->keychain->credentialForClient(account_, record.clientId);
+      const auto credential =
+          state->keychain->credentialForClient(account_, record.clientId, clients::Evidence::kSandbox);
       isWhole = isWhole && record.granted == (credential != nullptr);
       if (credential == nullptr) continue;
       EXPECT_TRUE(record.granted) << what;

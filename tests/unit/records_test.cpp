@@ -171,7 +171,10 @@ TEST_F(StoredRecords, StandUnchangedWhereTheDiskIsFull) {
   for (int round = 0; round < 2; ++round) {
     EXPECT_THAT(clients(true), ElementsAre("app"));
     EXPECT_EQ(state_->accounts->list().size(), 1U);
-    EXPECT_EQ(state_->keychain->credentialForClient(account, "app")->oauthToken().reveal(), "kept");
+    EXPECT_EQ(state_->keychain->credentialForClient(account, "app", clients::Evidence::kRegistered)
+                  ->oauthToken()
+                  .reveal(),
+              "kept");
     reopen();
   }
   state_->put("app", false);
@@ -204,8 +207,8 @@ TEST_F(StoredRecords, CanBeWrittenAndReadFromManyThreads) {
         EXPECT_LE(state_->records->list(kType).size(), 4U);
         EXPECT_TRUE(state_->accessLog.newest(5));
         if (i % 2 == 1) {
-          const auto credential =
-              state_->keychain->credentialForClient(state_->accounts->list().at(0).identifier, id);
+          const auto credential = state_->keychain->credentialForClient(
+              state_->accounts->list().at(0).identifier, id, clients::Evidence::kRegistered);
           EXPECT_EQ(credential->oauthToken().reveal(), std::to_string(i));
         }
       }
@@ -270,7 +273,7 @@ TEST_F(StoredAccounts, ThatAreRetiredKeepTheirOwnCredentialAlone) {
     EXPECT_EQ(retired.at(0).accountType, kType);
     EXPECT_EQ(state_->keychain->credentialForAccount(*carrier, std::nullopt)->oauthToken().reveal(),
               "master");
-    EXPECT_EQ(state_->keychain->credentialForClient(id, "app"), nullptr);
+    EXPECT_EQ(state_->keychain->credentialForClient(id, "app", clients::Evidence::kRegistered), nullptr);
     reopen();
   }
   EXPECT_EQ(state_->accounts->retire(id).failure().kind, base::FailureKind::kNotFound);
