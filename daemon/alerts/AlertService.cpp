@@ -36,13 +36,14 @@ struct AlertService::Alert {
   Time deadline = Time::max();
   std::shared_ptr<requests::RequestContext> context;
   std::unique_ptr<requests::RequestContext::Waiting> waiting;
-  requests::RequestContext::Registration registration;
 
   // Protected by the service's lock.
   std::uint64_t turn = 0;
   std::condition_variable changed;
   std::optional<ZQResponseFlags> ended;
   std::shared_ptr<Showing> showing;
+
+  requests::RequestContext::Registration registration;  // goes first: what it calls uses the others
 };
 
 AlertService::AlertService(AgentCaller& agents, state::IdentifierSource newIdentifier, PauseAfter pauseAfter)
@@ -129,7 +130,8 @@ AlertService::Alert* AlertService::next() const {
     if (alert->ended || (first != nullptr && first->turn <= alert->turn)) continue;
     if (const auto& context = alert->context) {
       const auto answered = answered_.find(context->clientKey());
-      if (context->isOutdated() || (answered != answered_.end() && !answered->second.expired())) continue;
+      const auto request = answered != answered_.end() ? answered->second.lock() : nullptr;
+      if (context->isOutdated() || (request != nullptr && request != context)) continue;
     }
     first = alert;
   }
@@ -142,8 +144,7 @@ void AlertService::wakeNext() {
 
 // Has the alert wait for its turn.
 void AlertService::join(Lock& lock, Alert& alert) {
-  const bool isKnown = alert.context != nullptr && alert.context->evidence() != clients::Evidence::kUnknown;
-  alert.turn = turns_.join(isKnown ? alert.context->clientKey() : "");
+  alert.turn = turns_.join(alert.context != nullptr ? alert.context->shareKey() : "");
   waiting_.push_back(&alert);
   if (alert.context == nullptr || !alert.context->isOutdated()) return;
   lock.unlock();

@@ -110,11 +110,8 @@ SnapName snapOf(const FileDescriptor& process, const std::string& controlGroup) 
   // Neither file is there, or one cannot be read, where no security module is.
   auto label = readProcFile(process, "attr/apparmor/current", {ENOENT, EINVAL});
   if (!label) label = readProcFile(process, "attr/current", {ENOENT, EINVAL});
-  if (label) {
-    const SnapName snap = snapOfLabel(*label);
-    if (snap.kind != SnapName::Kind::kNone) return snap;
-  }
-  return snapOfControlGroup(controlGroup);
+  // Programs can name their units as they like, but not their labels.
+  return label ? snapOfLabel(*label) : snapOfControlGroup(controlGroup);
 }
 
 // The file name of the process's program.

@@ -61,6 +61,8 @@ base::Result<Keychain::Standing> Keychain::standing(const Place& place) {
 }
 
 bool Keychain::mayBeRead(const Place& place, std::optional<clients::Evidence> client) {
+  // Who has written comes first: a writer that has ended by then has its record.
+  const Request writer = writerOf(place);
   const auto found = standing(place);
   if (!found)
     logging::error(log_,
@@ -68,7 +70,6 @@ bool Keychain::mayBeRead(const Place& place, std::optional<clients::Evidence> cl
                    {RVValue(place.accountId), ownerOf(place), RVValue(found.failure().message)});
   if (!found || !found->isOfAnAccount || found->isDeleted) return false;
   if (!client) return true;
-  const Request writer = writerOf(place);
   return found->isGranted && found->evidence <= *client && (!writer || writer->evidence() <= *client);
 }
 
@@ -115,9 +116,9 @@ std::optional<RVError> Keychain::changeFor(const Request& request,
 
 base::Result<void> Keychain::checkEvidence(const Place& place, const Request& request) {
   if (request == nullptr || request->evidence() == clients::Evidence::kUnknown) return {};
+  const Request writer = writerOf(place);  // before the record: see mayBeRead
   const auto found = standing(place);
   if (!found) return found.failure();
-  const Request writer = writerOf(place);
   const auto strongest = std::max(found->evidence, writer ? writer->evidence() : clients::Evidence::kUnknown);
   if (strongest > request->evidence())
     return base::Failure{base::FailureKind::kRefused,
@@ -173,13 +174,12 @@ std::optional<RVError> Keychain::setCredentialForAccount(const RVAccount& accoun
   const Place place{account.identifier(), clientID};
   const Request request = requestOf(account);
   auto error = changeFor(request, place, [&] {
-    {
-      // Before it is stored, so that nobody reads it who may not.
-      const std::lock_guard lock(mutex_);
-      std::erase_if(writers_, [](const auto& entry) { return entry.second.expired(); });
-      writers_.insert_or_assign(place, request);
-    }
-    return store(place, *credential);
+    // Before it is stored, so that nobody reads it who may not.
+    const Request earlier = writerOf(place);
+    noteWriter(place, request);
+    auto stored = store(place, *credential);
+    if (!stored) noteWriter(place, earlier);
+    return stored;
   });
   if (!error) storeHasWorked();
   return error;
@@ -285,6 +285,12 @@ Keychain::Request Keychain::writerOf(const Place& place) {
   return found != writers_.end() ? found->second.lock() : nullptr;
 }
 
+void Keychain::noteWriter(const Place& place, const Request& request) {
+  const std::lock_guard lock(mutex_);
+  std::erase_if(writers_, [](const auto& entry) { return entry.second.expired(); });
+  writers_.insert_or_assign(place, request);
+}
+
 void Keychain::requestEnded(const Request& request) {
   if (request == nullptr) return;
   std::vector<Place> written;
@@ -299,9 +305,11 @@ void Keychain::requestEnded(const Request& request) {
   for (const Place& place : written) {
     if (writerOf(place) != request) continue;
     const auto found = standing(place);
-    const auto done = !found             ? base::Result<void>(found.failure())
-                      : found->isGranted ? base::Result<void>()
-                                         : remove(place);
+    // What stronger evidence has stored does not stay under a record of weaker evidence.
+    const bool mayStay = found && found->isGranted && found->evidence >= request->evidence();
+    const auto done = !found    ? base::Result<void>(found.failure())
+                      : mayStay ? base::Result<void>()
+                                : remove(place);
     if (!done)
       logging::error(
           log_, "What a void request has stored cannot be deleted: %@", {RVValue(done.failure().message)});

@@ -97,6 +97,7 @@ class Keychain : public RVDKeychainManager {
 
   // The living request that wrote there last; null where there is none.
   Request writerOf(const Place& place);
+  void noteWriter(const Place& place, const Request& request);
 
   records::Database& database_;
   CredentialStore& store_;

@@ -16,7 +16,7 @@ namespace credentials {
 // stored, as long as the keyring is unlocked.
 //
 // A keyring that is locked, gone or does not answer is a failure (kFailed) of the call alone; nobody is asked
-// to unlock it, and the next call finds it as it is then. Thread-safe; every call runs on its own connection,
+// to unlock it, and the next call finds it as it is then. Thread-safe; every call runs
 // on the calling thread, which is not the bus thread.
 class SecretServiceStore final : public CredentialStore {
  public:

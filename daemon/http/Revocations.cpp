@@ -10,7 +10,13 @@ namespace {
 
 using std::chrono::milliseconds;
 
+constexpr int kTooManyRequests = 429;
 constexpr int kFirstServerError = 500;
+
+// Made by whatever stands before a server that is down or overloaded.
+bool isMadeForTheServer(int statusCode) {
+  return statusCode == kTooManyRequests || statusCode >= kFirstServerError;
+}
 
 bool hasCode(const std::optional<RVError>& error, TransferErrorCode code) {
   return error && error->code == static_cast<std::int64_t>(code);
@@ -19,11 +25,13 @@ bool hasCode(const std::optional<RVError>& error, TransferErrorCode code) {
 // Why the server has not answered; absent where it has.
 std::optional<RVError> whyUnanswered(const std::optional<TKHTTPResponse>& response,
                                      const std::optional<RVError>& error) {
-  if (!response || !error) return error;
-  if (hasCode(error, TransferErrorCode::kAnswerTooLarge)) return std::nullopt;
-  if (hasCode(error, TransferErrorCode::kNoBody) && response->statusCode < kFirstServerError)
-    return std::nullopt;
-  return error;
+  if (!response) return error;
+  const bool isWhole = !error || hasCode(error, TransferErrorCode::kAnswerTooLarge) ||
+                       hasCode(error, TransferErrorCode::kNoBody);
+  if (!isWhole) return error;
+  if (!isMadeForTheServer(response->statusCode)) return std::nullopt;
+  return transferError(TransferErrorCode::kFailed,
+                       "the server is not at work: status " + std::to_string(response->statusCode));
 }
 
 std::string textOf(const RVError& error) {

@@ -22,8 +22,8 @@ namespace http {
 
 // Tells the server what is in the outbox: at once when it is put there and at each start, and again after
 // growing pauses until the server has answered. It has answered when an HTTP response came, whatever it
-// says, save one of 500 or above without a body: those are made by whatever stands before a server that is
-// down.
+// says, save one of status 429, or 500 and above: those are made by whatever stands before a server that is
+// down or overloaded.
 //
 // Thread-safe. Tokens are read, exchanges begun and continuations run without a lock of this object.
 class Revocations {

@@ -25,6 +25,11 @@ RequestContext::RequestContext(std::string clientKey,
 
 RequestContext::~RequestContext() = default;
 
+std::string RequestContext::shareKey() const {
+  if (evidence_ == clients::Evidence::kUnknown) return {};
+  return std::to_string(static_cast<std::int64_t>(evidence_)) + " " + clientKey_;
+}
+
 std::optional<VoidReason> RequestContext::voidReason() const {
   const std::lock_guard lock(reasonMutex_);
   return reason_;
@@ -96,7 +101,7 @@ std::unique_ptr<RequestContext::Waiting> RequestContext::beginWaiting() {
   if (isVoid()) return nullptr;
   {
     const std::lock_guard lock(waitingMutex_);
-    if (waiting_ > 0 || limiter_ == nullptr || limiter_->beginWaiting(clientKey_)) {
+    if (waiting_ > 0 || limiter_ == nullptr || limiter_->beginWaiting(shareKey())) {
       ++waiting_;
       return std::make_unique<Waiting>(this);
     }
@@ -107,7 +112,7 @@ std::unique_ptr<RequestContext::Waiting> RequestContext::beginWaiting() {
 
 void RequestContext::endWaiting() {
   const std::lock_guard lock(waitingMutex_);
-  if (--waiting_ == 0 && limiter_ != nullptr) limiter_->endWaiting(clientKey_);
+  if (--waiting_ == 0 && limiter_ != nullptr) limiter_->endWaiting(shareKey());
 }
 
 std::shared_ptr<RequestContext> RequestContext::current() {

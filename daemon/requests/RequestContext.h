@@ -53,6 +53,10 @@ class RequestContext {
 
   const std::string& clientKey() const { return clientKey_; }
 
+  // For what is counted and shared out between clients. Those that nothing is known about are one, since
+  // they are as many as somebody makes of them; who is known with another certainty may be another.
+  std::string shareKey() const;
+
   // What an alert tells about the client besides the plug-in's words, by the keys of Agent1's description.
   const RVDictionary& clientDetails() const { return details_; }
 

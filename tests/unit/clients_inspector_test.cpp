@@ -209,8 +209,18 @@ TEST_F(AProcess, InASnapIsWhatItsLabelSays) {
   expectConfined("photos_other");
 }
 
+TEST_F(AProcess, WithALabelOfNoSnapIsNoSnapWhateverItsUnitIsCalled) {
+  proc_.addUnconfined(kPID);
+  proc_.write(kPID, "attr/apparmor/current", "unconfined\n");
+  proc_.setControlGroup(kPID,
+                        "/user.slice/user-1000.slice/user@1000.service/app.slice/"
+                        "snap.photos.viewer-0b1c2d3e.scope");
+  expectUnconfined();
+}
+
 TEST_F(AProcess, InASnapIsWhatItsControlGroupSays) {
   proc_.addUnconfined(kPID);
+  proc_.remove(kPID, "attr/current");  // no security module tells more
   proc_.setControlGroup(kPID,
                         "/user.slice/user-1000.slice/user@1000.service/app.slice/"
                         "snap.photos.viewer-b1e9ec07-e2a0-4a3f-8f2c-0a4a5cd3f3f2.scope");

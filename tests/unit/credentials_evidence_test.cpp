@@ -90,6 +90,16 @@ TEST_F(ACredentialOfAClient, IsNotHandedOutOnTheStrengthOfAWeakerRecordThatItWas
   EXPECT_NE(state_.keychain->credentialForClient(account_, "app", Evidence::kSandbox), nullptr);
 }
 
+TEST_F(ACredentialOfAClient, DoesNotStayUnderAWeakerRecordThanItWasStoredFor) {
+  ASSERT_TRUE(store("weak", request(Evidence::kRegistered)));
+  record(Evidence::kRegistered);
+  const auto strong = request(Evidence::kSandbox);
+  ASSERT_TRUE(store("strong", strong));
+  strong->makeVoid(requests::VoidReason::kCallerGone);
+  state_.keychain->requestEnded(strong);
+  EXPECT_EQ(token(), "(absent)");
+}
+
 TEST_F(ACredentialOfAClient, IsTheUsersToChangeWhateverTheEvidence) {
   ASSERT_TRUE(store("strong", request(Evidence::kSandbox)));
   record(Evidence::kSandbox);

@@ -164,7 +164,7 @@ TEST_F(AnOwedRevocation, IsWrittenDownAndTriedAtOnceAndNoMoreOnceItWasAnswered) 
   EXPECT_TRUE(state->log.lines().empty());
 }
 
-TEST_F(AnOwedRevocation, IsAnsweredByAnyResponseThatAServerMakes) {
+TEST_F(AnOwedRevocation, IsAnsweredByAnyResponseThatTheServerItselfMakes) {
   struct Case {
     std::optional<int> status;
     std::optional<TransferErrorCode> error;
@@ -173,7 +173,10 @@ TEST_F(AnOwedRevocation, IsAnsweredByAnyResponseThatAServerMakes) {
   const std::vector<Case> cases = {
       {200, std::nullopt, true},
       {401, std::nullopt, true},
-      {503, std::nullopt, true},
+      {429, std::nullopt, false},
+      {500, std::nullopt, false},
+      {503, std::nullopt, false},
+      {502, TransferErrorCode::kAnswerTooLarge, false},
       {302, TransferErrorCode::kNoBody, true},
       {404, TransferErrorCode::kNoBody, true},
       {200, TransferErrorCode::kAnswerTooLarge, true},

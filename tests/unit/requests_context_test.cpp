@@ -185,5 +185,17 @@ TEST_F(ARequest, IsTheCurrentOneOfItsThreadAlone) {
   EXPECT_EQ(RequestContext::current(), context_);
 }
 
+TEST(Shares, AreOnePerClientAndCertaintyAndOneForAllThatNothingIsKnownAbout) {
+  const auto share = [](const std::string& client, clients::Evidence evidence) {
+    return RequestContext(client, nullptr, {}, evidence).shareKey();
+  };
+  using clients::Evidence;
+  EXPECT_EQ(share(":1.1", Evidence::kUnknown), share(":1.2", Evidence::kUnknown));
+  EXPECT_EQ(share("a", Evidence::kScope), share("a", Evidence::kScope));
+  EXPECT_NE(share("a", Evidence::kScope), share("b", Evidence::kScope));
+  EXPECT_NE(share("a", Evidence::kScope), share("a", Evidence::kRegistered));
+  EXPECT_NE(share("a", Evidence::kRegistered), share(":1.1", Evidence::kUnknown));
+}
+
 }  // namespace
 }  // namespace requests
