@@ -157,8 +157,10 @@ void Inspections::Shared::watch() {
       continue;
     }
     const auto first = jobs.begin();
-    if (Clock::now() < first->second.deadline) {
-      changed.wait_until(lock, first->second.deadline);
+    // A copy: who waits looks at it again when the job may be gone.
+    const Clock::time_point until = first->second.deadline;
+    if (Clock::now() < until) {
+      changed.wait_until(lock, until);
       continue;
     }
     if (first->second.runs) ++givenUp;
