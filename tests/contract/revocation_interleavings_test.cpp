@@ -335,7 +335,12 @@ void Interleavings::check(const std::vector<Grant>& grants,
 }
 
 TEST_F(Interleavings, OfARevocationWithGrantsAndReadsLeaveNothingToReadAfterIt) {
-  const std::uint64_t count = numberFrom("RVD_INTERLEAVINGS", 1000);
+#if defined(__SANITIZE_THREAD__) || defined(__SANITIZE_ADDRESS__)
+  const std::uint64_t usual = 200;
+#else
+  const std::uint64_t usual = 1000;
+#endif
+  const std::uint64_t count = numberFrom("RVD_INTERLEAVINGS", usual);
   const std::uint64_t seed = numberFrom("RVD_INTERLEAVINGS_SEED", std::random_device()());
   std::cout << "seed " << seed << ", " << count << " interleavings\n";
   for (std::uint64_t i = 0; i < count && !HasFailure(); ++i) runOne(seed + i);

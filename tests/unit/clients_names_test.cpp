@@ -173,7 +173,12 @@ TEST(AHostileName, OfAnyMixtureIsFitToBeShown) {
 }
 
 TEST(AHostileName, OfEachSingleCharacterIsFitToBeShown) {
-  for (UChar32 character = 0; character <= 0x10ffff; ++character) {
+#if defined(__SANITIZE_THREAD__) || defined(__SANITIZE_ADDRESS__)
+  constexpr UChar32 kStep = 31;
+#else
+  constexpr UChar32 kStep = 1;
+#endif
+  for (UChar32 character = 0; character <= 0x10ffff; character += kStep) {
     std::array<char, 4> encoded{};
     std::int32_t length = 0;
     UBool isError = false;

@@ -373,7 +373,7 @@ std::string text(const ModelOutcome& outcome) {
 
 TEST(ThePlugin, DecidesRecordsAndReportsAsTheModelDoesOverRandomSequences) {
 #if defined(__SANITIZE_THREAD__) || defined(__SANITIZE_ADDRESS__)
-  const std::uint64_t usual = 10'000;
+  const std::uint64_t usual = 2'000;
 #else
   const std::uint64_t usual = 100'000;
 #endif
