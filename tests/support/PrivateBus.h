@@ -17,12 +17,23 @@ class PrivateBus {
   PrivateBus() {
     int ends[2];
     if (::pipe(ends) != 0) throw std::runtime_error("no pipe for the bus's address");
+    // It dies with the test, whatever becomes of that.
+    std::string wrapper = "setpriv";
+    std::string onParentsDeath = "--pdeathsig";
+    std::string kill = "KILL";
     std::string program = "dbus-daemon";
     std::string configuration = "--config-file=" + directory_.write("bus.conf", kConfiguration);
     std::string stay = "--nofork";
     std::string print = "--print-address=" + std::to_string(ends[1]);
-    char* const arguments[] = {program.data(), configuration.data(), stay.data(), print.data(), nullptr};
-    const int error = ::posix_spawnp(&process_, "dbus-daemon", nullptr, nullptr, arguments, environ);
+    char* const arguments[] = {wrapper.data(),
+                               onParentsDeath.data(),
+                               kill.data(),
+                               program.data(),
+                               configuration.data(),
+                               stay.data(),
+                               print.data(),
+                               nullptr};
+    const int error = ::posix_spawnp(&process_, "setpriv", nullptr, nullptr, arguments, environ);
     ::close(ends[1]);
     for (char byte = 0; error == 0 && ::read(ends[0], &byte, 1) == 1 && byte != '\n';) address_ += byte;
     ::close(ends[0]);

@@ -6,5 +6,5 @@ rvd_test(storage_tests
   LIBRARIES rvd_credentials rvd_records rvd_preferences rvd_fakes)
 find_package(sdbus-c++ 1.2 REQUIRED)
 rvd_test(secret_service_tests
-  SOURCES unit/credentials_secret_service_test.cpp
+  SOURCES unit/credentials_secret_service_test.cpp support/SanitizerOptions.cpp
   LIBRARIES rvd_secret_service rvd_credentials rvd_records rvd_fakes SDBusCpp::sdbus-c++)
