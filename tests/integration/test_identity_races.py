@@ -114,9 +114,16 @@ def test_a_connection_that_is_passed_on_keeps_its_identity(world):
     assert late.standing() == "unconfined"
 
 
-def test_a_marker_that_never_answers_makes_its_program_unknown_and_holds_nobody_up(world):
+def test_a_marker_that_never_answers_makes_its_program_unknown_and_holds_nobody_up(bare_world, standin):
     if os.geteuid() != 0 or not os.path.exists("/dev/fuse"):
         pytest.skip("only root, with /dev/fuse, can make a file system that hangs")
+    world = bare_world
+    if "ASAN_OPTIONS" in world.environment:
+        # The search for leaks stops all threads first, which one that hangs in the kernel cannot be.
+        world.environment["ASAN_OPTIONS"] += ":detect_leaks=0"
+    world.start_bus()
+    world.configure(standin.url)
+    world.start_daemon()
     raw = RawProgram(world)
     raw.hang(world.folder("hanging"))
     raw.process.popen.stdin.write((json.dumps({"call": [MANAGEMENT, "ListAccounts", ""]}) + "\n").encode())
