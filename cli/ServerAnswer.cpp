@@ -27,14 +27,13 @@ ServerAnswer::ServerAnswer(Service& service, std::optional<std::string> clientID
       clientID_(std::move(clientID)) {
   const auto isWatched = service_.watchAuthorizations();
   const auto authorizations = service_.authorizations();
-  const auto accounts = service_.accounts();
   const auto owed = pending();
-  if (!isWatched || !authorizations || !accounts || !owed) return;
+  if (!isWatched || !authorizations || !owed) return;
   isKnown_ = true;
   before_ = attemptsOf(*owed);
   isThereSomethingToTell_ =
       !owed->empty() || std::any_of(authorizations->begin(), authorizations->end(), [&](const Json& record) {
-        return !accounts->empty() && concerns(Json::array({record.value("client_id", "")})) &&
+        return concerns(Json::array({record.value("client_id", "")})) &&
                record.value("options", Json::object()).contains("app_id");
       });
 }
