@@ -30,18 +30,12 @@ std::string errorText(const Json& error) {
   return text;
 }
 
-// "a, b"; "none" where there is none.
-std::string joined(const Json& names) {
-  std::string line;
-  for (const Json& name : names) line += (line.empty() ? "" : ", ") + valueText(name);
-  return line.empty() ? "none" : line;
-}
-
 std::string exchangeText(const Json& exchange) {
   std::string text = textOf(exchange, "exchange");
   for (const auto& [key, value] : exchange.items())
     if (key != "exchange")
-      text += "  " + base::visible(key) + "=" + (value.is_array() ? joined(value) : valueText(value));
+      text +=
+          "  " + base::visible(key) + "=" + (value.is_array() ? listText(value, "none") : valueText(value));
   return text;
 }
 
@@ -66,7 +60,7 @@ std::string explanationText(const Json& explanation) {
   text += labelled("reason", textOf(explanation, "reason"));
   if (explanation.contains("error")) text += labelled("error", errorText(explanation["error"]));
   if (explanation.contains("new_permissions"))
-    text += labelled("new", joined(explanation["new_permissions"]));
+    text += labelled("new", listText(explanation["new_permissions"], "none"));
   if (explanation.contains("message")) text += alertText(explanation);
   for (const char* key : {"description_request", "server_request"})
     if (explanation.contains(key)) text += labelled("sent", exchangeText(explanation[key]));

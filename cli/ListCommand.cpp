@@ -6,13 +6,6 @@
 namespace cli {
 namespace {
 
-// "a, b"; "-" where there is none.
-std::string joined(const Json& texts) {
-  std::string line;
-  for (const Json& text : texts) line += (line.empty() ? "" : ", ") + valueText(text);
-  return line.empty() ? "-" : line;
-}
-
 std::string optionsText(const Json& options) {
   std::string line;
   for (const auto& [key, value] : options.items())
@@ -38,7 +31,7 @@ ExitStatus listAuthorizations(Session& session) {
     rows.push_back({record.value("client_id", ""),
                     record.value("name", ""),
                     record.value("granted", false) ? "granted" : "refused",
-                    joined(record.value("permissions", Json::array())),
+                    listText(record.value("permissions", Json::array()), "-"),
                     optionsText(record.value("options", Json::object())),
                     record.value("evidence", "-"),
                     timeText(record.value("changed", 0LL))});
@@ -60,7 +53,7 @@ ExitStatus listPendingRevocations(Session& session) {
   }
   std::vector<std::vector<std::string>> rows;
   for (const Json& owed : *pending)
-    rows.push_back({joined(owed.value("client_ids", Json::array())),
+    rows.push_back({listText(owed.value("client_ids", Json::array()), "-"),
                     owed.value("app_id", ""),
                     timeText(owed.value("since", 0LL)),
                     std::to_string(owed.value("attempts", 0LL)),

@@ -65,6 +65,12 @@ std::string valueText(const Json& value) {
   return value.is_string() ? base::visible(value.get<std::string>()) : asciiText(value, -1);
 }
 
+std::string listText(const Json& list, const char* whenEmpty) {
+  std::string line;
+  for (const Json& value : list) line += (line.empty() ? "" : ", ") + valueText(value);
+  return line.empty() ? whenEmpty : line;
+}
+
 void Output::print(const Json& document) {
   out_ << asciiText(document, 2) << '\n';
 }

@@ -23,6 +23,9 @@ std::string timeText(long long secondsSince1970);
 // A value on one line: a text as it is, everything else as JSON.
 std::string valueText(const Json& value);
 
+// A list's values on one line: "a, b"; `whenEmpty` where there is none.
+std::string listText(const Json& list, const char* whenEmpty);
+
 // Text, or one JSON document, to standard output; what went wrong to standard error.
 class Output {
  public:
