@@ -102,13 +102,11 @@ void AccountsService::registerCaller(const std::shared_ptr<Call>& call) {
   call->reply();
 }
 
-// Those that nothing is known about are counted as one, since they are as many as somebody makes of them.
 void AccountsService::checkRate(const std::string& uniqueName) const {
   const auto identity = parts_.identities.identityOf(uniqueName);
-  const std::string key = identity.application
-                              ? identity.application->id + " " + std::string(evidenceText(identity.evidence))
-                              : "";
-  if (!parts_.rate.take(key)) throw sdbus::Error(kLimitsExceeded, "The client calls too often");
+  const std::string clientKey = identity.application ? clientKeyOfID(identity.application->id) : uniqueName;
+  if (!parts_.rate.take(requests::shareKeyOf(clientKey, identity.evidence)))
+    throw sdbus::Error(kLimitsExceeded, "The client calls too often");
 }
 
 void AccountsService::requestAccess(const std::shared_ptr<Call>& call) {

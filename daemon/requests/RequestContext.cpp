@@ -13,6 +13,11 @@ void runOnce(std::function<void()>& callback) {
 
 }  // namespace
 
+std::string shareKeyOf(const std::string& clientKey, clients::Evidence evidence) {
+  if (evidence == clients::Evidence::kUnknown) return {};
+  return std::to_string(static_cast<std::int64_t>(evidence)) + " " + clientKey;
+}
+
 RequestContext::RequestContext(std::string clientKey,
                                std::shared_ptr<WaitingLimiter> limiter,
                                RVDictionary details,
@@ -24,11 +29,6 @@ RequestContext::RequestContext(std::string clientKey,
 }
 
 RequestContext::~RequestContext() = default;
-
-std::string RequestContext::shareKey() const {
-  if (evidence_ == clients::Evidence::kUnknown) return {};
-  return std::to_string(static_cast<std::int64_t>(evidence_)) + " " + clientKey_;
-}
 
 std::optional<VoidReason> RequestContext::voidReason() const {
   const std::lock_guard lock(reasonMutex_);

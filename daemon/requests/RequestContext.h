@@ -34,6 +34,10 @@ class WaitingLimiter {
   virtual void endWaiting(const std::string& clientKey) = 0;
 };
 
+// Tells clients apart for what is counted and shared out between them. Those that nothing is known about are
+// one, since they are as many as somebody makes of them; who is known with another certainty may be another.
+std::string shareKeyOf(const std::string& clientKey, clients::Evidence evidence);
+
 // One request on its way through a plug-in. A request that is void has no effect any more: its alert is
 // taken down, its transfers are ended, and no record, credential or log entry is written for it.
 //
@@ -53,9 +57,7 @@ class RequestContext {
 
   const std::string& clientKey() const { return clientKey_; }
 
-  // For what is counted and shared out between clients. Those that nothing is known about are one, since
-  // they are as many as somebody makes of them; who is known with another certainty may be another.
-  std::string shareKey() const;
+  std::string shareKey() const { return shareKeyOf(clientKey_, evidence_); }
 
   // What an alert tells about the client besides the plug-in's words, by the keys of Agent1's description.
   const RVDictionary& clientDetails() const { return details_; }
